@@ -1,0 +1,54 @@
+# evwatch: the two commands a user needs are `make demo` and `make test`.
+#
+#   make            install what is missing, build everything into build/
+#   make test       ... and run the whole suite
+#   make test SANITIZE=1        the same suite under AddressSanitizer + UBSan (build-asan/)
+#   make test SANITIZE=thread   the same suite under ThreadSanitizer (build-tsan/)
+#   make demo       run evwatch against its built-in camera simulator
+#   make bench      build and run the benchmarks
+#   make lib        build only libeventdetector and libevhost (build-lib/)
+
+SANITIZE ?=
+JOBS ?= $(shell nproc 2>/dev/null || echo 2)
+
+ifeq ($(SANITIZE),)
+  BUILD := build
+  SAN :=
+else ifeq ($(SANITIZE),thread)
+  BUILD := build-tsan
+  SAN := thread
+else
+  BUILD := build-asan
+  SAN := address
+endif
+
+.PHONY: all deps configure build test demo bench lib clean
+
+all: build
+
+deps:
+	@scripts/install-deps.sh
+
+configure: deps
+	@cmake -S . -B $(BUILD) -DEVW_SANITIZE=$(SAN) >/dev/null
+
+build: configure
+	@cmake --build $(BUILD) -j $(JOBS)
+
+test: build
+	@cd $(BUILD) && ctest --output-on-failure -j $(JOBS) --timeout 300
+
+demo: configure
+	@cmake --build $(BUILD) -j $(JOBS) --target evwatch
+	@$(BUILD)/bin/evwatch demo $(if $(DURATION),--duration $(DURATION))
+
+bench: build
+	@cmake --build $(BUILD) -j $(JOBS) --target bench_all 2>/dev/null || true
+	@scripts/run-bench.sh $(BUILD)
+
+lib: deps
+	@cmake -S . -B build-lib -DEVW_LIBRARY_ONLY=ON >/dev/null
+	@cmake --build build-lib -j $(JOBS) --target eventdetector evhost
+
+clean:
+	rm -rf build build-asan build-tsan build-lib

@@ -1,0 +1,43 @@
+// The loop that every polled detector runs, written once: a reading per period until the
+// detector is stopped, a report per pass, and a final (false, 0) so that the host never
+// keeps a stale "active" state after Stop. Runs on the detector's worker thread.
+
+#ifndef EVWATCH_FRAMEWORK_POLLEDLOOP_H_
+#define EVWATCH_FRAMEWORK_POLLEDLOOP_H_
+
+#include "framework/detector.h"
+#include "framework/host/delaytimer.h"
+#include "framework/host/eventbuf.h"
+
+// What one pass reports through EventBuf::SetStatus.
+struct PassReport {
+  bool state;
+  int value;
+};
+
+// A motion reading: (state, level) when the reading succeeded, else (false, 0).
+inline PassReport MotionReport(int result, bool state, unsigned int level) {
+  return result == 0 ? PassReport{state, static_cast<int>(level)} : PassReport{false, 0};
+}
+
+// An input reading: (state, 1) when the reading succeeded, else (false, 0); the value is a
+// validity flag.
+inline PassReport InputReport(int result, bool state) {
+  return result == 0 ? PassReport{state, 1} : PassReport{false, 0};
+}
+
+// Runs pass() once per period (microseconds) while detector.IsStarted() yields 1, reporting
+// each PassReport it returns to buffer; then reports (false, 0).
+template <typename Pass>
+void RunPolledLoop(DetectorBase& detector, EventBuf* buffer, int period, Pass&& pass) {
+  DelayTimer timer(period);
+  timer.BeginTiming();
+  while (detector.IsStarted() == 1) {
+    PassReport report = pass();
+    buffer->SetStatus(report.state, report.value);
+    timer.Delay();
+  }
+  buffer->SetStatus(false, 0);
+}
+
+#endif  // EVWATCH_FRAMEWORK_POLLEDLOOP_H_
