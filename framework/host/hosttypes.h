@@ -1,5 +1,6 @@
 // Enumerations shared by the detector library and the host services.
-// Plain values; no threading concerns.
+// Plain values; no threading concerns. The enums that carry configuration values have int
+// as their underlying type, so that any value a host passes ("any other group") is valid.
 
 #ifndef EVWATCH_FRAMEWORK_HOST_HOSTTYPES_H_
 #define EVWATCH_FRAMEWORK_HOST_HOSTTYPES_H_
@@ -13,12 +14,12 @@ enum __tag_HTTP_MAP_KEY { HTTP_CONTENT_TYPE = 0, HTTP_CONTENT_LENGTH = 1 };
 typedef __tag_HTTP_MAP_KEY HTTP_MAP_KEY;
 
 // What a detector that serves both kinds of event watches.
-enum EVENT_DET_TYPE { EVENT_DET_MOTION = 0, EVENT_DET_INPUT = 1 };
+enum EVENT_DET_TYPE : int { EVENT_DET_MOTION = 0, EVENT_DET_INPUT = 1 };
 
 // Vivotek event record in the JPEG header: 0 reads the APP0 form, any other value APP2.
-enum VIVO_FUNC_GR { VIVO_FUNC_GR_APP0 = 0, VIVO_FUNC_GR_APP2 = 1 };
+enum VIVO_FUNC_GR : int { VIVO_FUNC_GR_APP0 = 0, VIVO_FUNC_GR_APP2 = 1 };
 
 // Panasonic input-bit layout of the COM segment.
-enum PANA_FUNC_GR { PANA_FUNC_GR_0 = 0, PANA_FUNC_GR_1 = 1 };
+enum PANA_FUNC_GR : int { PANA_FUNC_GR_0 = 0, PANA_FUNC_GR_1 = 1 };
 
 #endif  // EVWATCH_FRAMEWORK_HOST_HOSTTYPES_H_
