@@ -1,0 +1,54 @@
+#include "framework/motiondata.h"
+
+#include <cstdio>
+
+#include "framework/readline.h"
+
+namespace {
+
+const int kLineSize = 128;
+
+// sscanf's result for one line: EOF when the line ends before the first field.
+int ScanLine(const char* line, MotionLineFormat format, int* level, int* threshold) {
+  switch (format) {
+    case MotionLineFormat::kGroupChar: {
+      char group = 0;
+      return sscanf(line, "group=%c;level=%d;threshold=%d;", &group, level, threshold);
+    }
+    case MotionLineFormat::kGroupNumber: {
+      int group = 0;
+      return sscanf(line, "group=%d;level=%d;threshold=%d;", &group, level, threshold);
+    }
+    case MotionLineFormat::kWindowNumber: {
+      int window = 0;
+      return sscanf(line, "window=%d;level=%d;threshold=%d", &window, level, threshold);
+    }
+  }
+  return EOF;
+}
+
+}  // namespace
+
+int ScanMotionLines(const char* body, int length, unsigned int& level, MotionLineFormat format,
+                    IdleLevel idle) {
+  if (length < 0) {
+    if (idle == IdleLevel::kLargest) level = 0;
+    return 0;
+  }
+  unsigned int largest = 0;
+  char line[kLineSize];
+  int position = -1;
+  do {
+    ReadLineFromBuf(body, position, length, line, kLineSize);
+    if (line[0] == '\0') continue;
+    int found_level = 0;
+    int threshold = 0;
+    const int fields = ScanLine(line, format, &found_level, &threshold);
+    level = static_cast<unsigned int>(found_level);
+    if (fields == EOF) break;
+    if (level > static_cast<unsigned int>(threshold)) return 1;
+    if (level > largest) largest = level;
+  } while (length > position);
+  if (idle == IdleLevel::kLargest) level = largest;
+  return 0;
+}
