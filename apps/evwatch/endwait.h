@@ -1,0 +1,26 @@
+// How a run ends: SIGINT or SIGTERM, the end of a duration, or a failed output.
+//
+// Threads: BlockEndSignals() first thing in main, before any thread exists, so that every
+// later thread inherits the blocked mask and only WaitForEnd() takes those signals.
+
+#ifndef EVWATCH_APPS_EVWATCH_ENDWAIT_H_
+#define EVWATCH_APPS_EVWATCH_ENDWAIT_H_
+
+#include <functional>
+#include <optional>
+
+namespace evwatch {
+
+enum class EndReason { kSignal, kDuration, kFailed };
+
+// Blocks SIGINT and SIGTERM for WaitForEnd() to take, and ignores SIGPIPE so that a closed
+// output is a failed write instead of a silent death.
+void BlockEndSignals();
+
+// Returns at SIGINT or SIGTERM, after `seconds` (never when nullopt), or once `failed()`
+// holds (checked a few times a second).
+EndReason WaitForEnd(std::optional<double> seconds, const std::function<bool()>& failed);
+
+}  // namespace evwatch
+
+#endif  // EVWATCH_APPS_EVWATCH_ENDWAIT_H_

@@ -1,0 +1,59 @@
+#include "sim/evwatchconfig.h"
+
+#include <gtest/gtest.h>
+
+namespace evsim {
+namespace {
+
+class EvwatchConfigTest : public ::testing::Test {
+ protected:
+  void SetUp() override {
+    SimOptions options;
+    options.emulations = {"canon"};
+    options.count = 2;
+    std::string error;
+    ASSERT_TRUE(sim_.Start(options, &error)) << error;
+  }
+  Simulator sim_;
+};
+
+TEST_F(EvwatchConfigTest, OneCameraEntryPerSimulatedCamera) {
+  nlohmann::ordered_json c = EvwatchConfig(sim_.Cameras(), {});
+  EXPECT_EQ(c["interval"], 500);
+  ASSERT_EQ(c["cameras"].size(), 2u);
+  for (size_t i = 0; i < 2; ++i) {
+    const auto& cam = c["cameras"][i];
+    EXPECT_EQ(cam["name"], sim_.Cameras()[i].name);
+    EXPECT_EQ(cam["host"], "127.0.0.1");
+    EXPECT_EQ(cam["port"], sim_.Cameras()[i].port);
+    EXPECT_FALSE(cam.contains("user"));
+    ASSERT_EQ(cam["detectors"].size(), 2u);
+    EXPECT_EQ(cam["detectors"][0]["class"], "CanonMD");
+    EXPECT_EQ(cam["detectors"][1]["class"], "CanonEID");
+    EXPECT_EQ(cam["detectors"][1]["inputs"], 1);
+  }
+}
+
+TEST_F(EvwatchConfigTest, KeepsOnlyAcceptedClassesAndCredentials) {
+  EvwatchConfigOptions options;
+  options.user = "admin";
+  options.password = "pw";
+  options.interval = 250;
+  options.keep = [](const std::string& cls) { return cls == "CanonEID"; };
+  nlohmann::ordered_json c = EvwatchConfig(sim_.Cameras(), options);
+  EXPECT_EQ(c["interval"], 250);
+  ASSERT_EQ(c["cameras"].size(), 2u);
+  EXPECT_EQ(c["cameras"][0]["user"], "admin");
+  EXPECT_EQ(c["cameras"][0]["password"], "pw");
+  ASSERT_EQ(c["cameras"][0]["detectors"].size(), 1u);
+  EXPECT_EQ(c["cameras"][0]["detectors"][0]["class"], "CanonEID");
+}
+
+TEST_F(EvwatchConfigTest, CamerasWithoutEntriesAreLeftOut) {
+  EvwatchConfigOptions options;
+  options.keep = [](const std::string&) { return false; };
+  EXPECT_TRUE(EvwatchConfig(sim_.Cameras(), options)["cameras"].empty());
+}
+
+}  // namespace
+}  // namespace evsim
