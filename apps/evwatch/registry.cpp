@@ -85,6 +85,7 @@ const char* KindName(DetectorKind kind) {
   switch (kind) {
     case DetectorKind::kMotion: return "motion";
     case DetectorKind::kInput: return "input";
+    case DetectorKind::kInputLevel: return "input (level)";
     case DetectorKind::kBoth: return "motion+input";
   }
   return "?";
@@ -169,7 +170,7 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<SanyoMD, Cam, Api>("SanyoMD", "Sanyo", K::kMotion,
                              "GET the API's stream path once a second: a 48-byte status record; "
                              "motion while bit 1 of byte 34 is set"),
-      Row<SanyoEID, Cam, Api, Inputs>("SanyoEID", "Sanyo", K::kInput,
+      Row<SanyoEID, Cam, Api, Inputs>("SanyoEID", "Sanyo", K::kInputLevel,
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),

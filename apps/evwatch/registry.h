@@ -24,9 +24,11 @@ class StreamBuffer;
 
 namespace evwatch {
 
-enum class DetectorKind { kMotion, kInput, kBoth };
+// kInputLevel: an input detector whose reading carries a level (100 while active) instead of
+// a validity flag.
+enum class DetectorKind { kMotion, kInput, kInputLevel, kBoth };
 
-// "motion", "input" or "motion+input".
+// "motion", "input", "input (level)" or "motion+input".
 const char* KindName(DetectorKind kind);
 
 // Configuration fields of a detector entry that a constructor may take (bit flags).

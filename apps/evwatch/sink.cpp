@@ -57,13 +57,14 @@ std::string Sink::Line(const Entry& e, const StatusReport& report) const {
     return line.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
   }
   // Motion reads as motion / no motion with its level; an input as active / idle with
-  // whether the reading was valid (0 also closes a detector's run).
+  // whether the reading was valid (0 also closes a detector's run), or with its level.
   const bool motion = e.kind == DetectorKind::kMotion;
+  const bool level = motion || e.kind == DetectorKind::kInputLevel;
   const char* words = motion ? (report.state ? "MOTION" : "no motion") : (report.state ? "ACTIVE" : "idle");
   std::ostringstream line;
   line << LocalTime(report.time) << "  " << std::left << std::setw(12) << e.camera << ' '
        << std::setw(16) << e.detector << ' ' << std::setw(10) << words << ' '
-       << (motion ? "level " : "valid ") << report.value;
+       << (level ? "level " : "valid ") << report.value;
   return line.str();
 }
 

@@ -80,6 +80,17 @@ TEST(SinkTest, EveryPrintsEachReport) {
   EXPECT_EQ(Lines(out.str()).size(), 5u);
 }
 
+TEST(SinkTest, InputWithALevelSaysLevel) {
+  std::ostringstream out;
+  Sink sink(out, OutputFormat::kText, false);
+  int h = sink.Add("gate", "inputs", "SanyoEID", DetectorKind::kInputLevel);
+  sink.Report(h, At(true, 100));
+  std::vector<std::string> lines = Lines(out.str());
+  ASSERT_EQ(lines.size(), 1u);
+  EXPECT_NE(lines[0].find("ACTIVE"), std::string::npos) << lines[0];
+  EXPECT_NE(lines[0].find("level 100"), std::string::npos) << lines[0];
+}
+
 TEST(SinkTest, TextSaysStateInWords) {
   std::ostringstream out;
   Sink sink(out, OutputFormat::kText, false);
