@@ -60,7 +60,8 @@ bool ValidArguments(const JpegImage& image, const std::vector<JpegSegment>& segm
   if (image.pixels == nullptr || image.width <= 0 || image.height <= 0 ||
       image.width > JPEG_MAX_DIMENSION || image.height > JPEG_MAX_DIMENSION ||
       (image.components != 1 && image.components != 3) || options.quality < 1 ||
-      options.quality > 100) {
+      options.quality > 100 || options.luma_h < 1 || options.luma_h > 2 || options.luma_v < 1 ||
+      options.luma_v > 2 || options.restart_interval < 0 || options.restart_interval > 65535) {
     return false;
   }
   for (const JpegSegment& segment : segments) {
@@ -99,6 +100,13 @@ bool Compress(const JpegImage& image, const std::vector<JpegSegment>& segments,
   jpeg_set_quality(&cinfo, options.quality, TRUE);
   cinfo.write_JFIF_header = options.jfif ? TRUE : FALSE;
   cinfo.JFIF_minor_version = static_cast<UINT8>(options.jfif_minor);
+  if (image.components == 3) {
+    cinfo.comp_info[0].h_samp_factor = options.luma_h;
+    cinfo.comp_info[0].v_samp_factor = options.luma_v;
+  }
+  cinfo.restart_interval = static_cast<unsigned int>(options.restart_interval);
+  cinfo.optimize_coding = options.optimize ? TRUE : FALSE;
+  if (options.progressive) jpeg_simple_progression(&cinfo);
   jpeg_start_compress(&cinfo, TRUE);
   for (const JpegSegment& segment : segments) {
     jpeg_write_marker(&cinfo, segment.marker,

@@ -34,6 +34,13 @@ struct JpegOptions {
   int quality = 75;   // 1..100
   bool jfif = false;  // write libjpeg's JFIF APP0 ahead of the segments
   int jfif_minor = 1; // JFIF version 1.<minor> when jfif is set
+  // Colour frames: the luminance's sampling factors (1..2 each; chroma is sampled once per
+  // MCU), 2x2 being 4:2:0.
+  int luma_h = 2;
+  int luma_v = 2;
+  int restart_interval = 0;  // MCUs between restart markers; 0 for none
+  bool optimize = false;     // Huffman tables made for the frame instead of the standard ones
+  bool progressive = false;
 };
 
 // An image: rows top-down, width * components bytes each, 1 component (grey) or 3 (RGB).
