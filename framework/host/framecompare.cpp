@@ -165,30 +165,31 @@ void FrameComparator::EstimateOffsetAndNoise(const uint8_t* frame, int gain_q8, 
 }
 
 void FrameComparator::Classify(const uint8_t* frame, int gain_q8, int offset, int threshold) {
-  // The previous frame as this frame's brightness would show it.
-  uint8_t before[256];
-  for (int v = 0; v < 256; ++v) {
-    before[v] = static_cast<uint8_t>(std::clamp(((v * gain_q8 + 128) >> 8) + offset, 0, 255));
-  }
   const int w = width_;
   const uint16_t* __restrict reference = reference_.data();
   const uint8_t* __restrict previous = previous_.data();
   for (int y = 0; y < height_; ++y) {
     const size_t row = static_cast<size_t>(y) * w;
+    const uint8_t* __restrict now = frame + row;
+    const uint16_t* __restrict ref = reference + row;
+    const uint8_t* __restrict prev = previous + row;
     uint8_t* __restrict cell = &cells_[static_cast<size_t>(y + 1) * (w + 2) + 1];
     uint8_t any = 0;
+    // Branch-free, so that the compiler can do many cells at once.
     for (int x = 0; x < w; ++x) {
-      const size_t i = row + x;
-      const int f = frame[i];
-      const int expected = Predicted8(reference[i], gain_q8) + offset;
+      const int f = now[x];
+      const int expected = Predicted8(ref[x], gain_q8) + offset;
       // A cell that the brightness change moved far is compared with more tolerance: its
       // colour channels clip one by one, which luminance alone cannot predict.
-      const int t = threshold + std::abs(expected - (reference[i] >> 8)) / kShiftTolerance;
+      const int t = threshold + std::abs(expected - (ref[x] >> 8)) / kShiftTolerance;
+      // The previous frame as this frame's brightness would show it.
+      const int before = std::clamp(((prev[x] * gain_q8 + 128) >> 8) + offset, 0, 255);
       const int a = std::abs(f - expected);
-      const int m = std::abs(f - before[previous[i]]);
-      cell[x] = static_cast<uint8_t>((a > t ? kAbove : 0) | (a > 2 * t ? kStrong : 0) |
-                                     (m > t ? kMoving : 0));
-      any |= cell[x];
+      const int m = std::abs(f - before);
+      const uint8_t flags = static_cast<uint8_t>((a > t ? kAbove : 0) | (a > 2 * t ? kStrong : 0) |
+                                                 (m > t ? kMoving : 0));
+      cell[x] = flags;
+      any |= flags;
     }
     row_above_[static_cast<size_t>(y)] = any & kAbove;
   }
@@ -235,36 +236,32 @@ void FrameComparator::MarkLive() {
 
 int FrameComparator::CountAndAdapt(const uint8_t* frame, int gain_q8, int offset, int threshold) {
   const int w = width_, stride = w + 2;
-  uint16_t* __restrict reference = reference_.data();
-  const uint8_t* __restrict mask = mask_.data();
   int changed = 0;
   for (int y = 0; y < height_; ++y) {
     const size_t row = static_cast<size_t>(y) * w;
+    const uint8_t* __restrict now = frame + row;
+    uint16_t* __restrict ref = reference_.data() + row;
+    const uint8_t* __restrict mask = mask_.data() + row;
     const uint8_t* __restrict cell = &cells_[static_cast<size_t>(y + 1) * stride + 1];
+    // Branch-free, so that the compiler can do many cells at once.
     for (int x = 0; x < w; ++x) {
-      const size_t i = row + x;
-      const int f = frame[i];
-      const int r = reference[i];
+      const int f = now[x] << 8;
+      const int r = ref[x];
       // The reference follows a global change of brightness at once, and what happens in
       // the cell slowly.
       const int base = Predicted88(r, gain_q8, offset);
-      const uint8_t flags = cell[x];
-      if ((flags & kAbove) == 0) {
-        // Where the brightness change moved the cell, what remains between the model and
-        // the frame is the model's error (clipping, the camera's curve): take the frame.
-        const bool moved = std::abs(base - r) >> 8 > threshold / 2;
-        reference[i] =
-            static_cast<uint16_t>(moved ? f << 8 : base + ((f << 8) - base) / (1 << kAdaptShift));
-      } else if ((flags & kLive) != 0) {
-        reference[i] = static_cast<uint16_t>(base);
-        changed += mask[i];
-      } else if ((flags & kMoving) == 0) {
-        // Different from the reference but nothing in its region moves: what was there
-        // has stopped, or the light changed there. It is the background now.
-        reference[i] = static_cast<uint16_t>(f << 8);
-      } else {
-        reference[i] = static_cast<uint16_t>(base);
-      }
+      const int flags = cell[x];
+      // Where the brightness change moved the cell, what remains between the model and the
+      // frame is the model's error (clipping, the camera's curve): take the frame.
+      const bool moved = std::abs(base - r) >> 8 > threshold / 2;
+      const int unchanged = moved ? f : base + (f - base) / (1 << kAdaptShift);
+      const int live = (flags & kLive) != 0 ? 1 : 0;
+      // Different from the reference but nothing in its region moves: what was there has
+      // stopped, or the light changed there. It is the background now.
+      const bool stopped = (flags & (kLive | kMoving)) == 0;
+      const int changing = stopped ? f : base;
+      ref[x] = static_cast<uint16_t>((flags & kAbove) == 0 ? unchanged : changing);
+      changed += live * mask[x];
     }
   }
   std::memcpy(previous_.data(), frame, reference_.size());
