@@ -20,7 +20,9 @@ constexpr size_t kSteps = size_t{1} << kStepBits;
 constexpr int kCodeBits = 9;
 constexpr int kMaxCodeLength = 16;
 constexpr int kMaxBlocksInMcu = 10;  // the format's limit (D_MAX_BLOCKS_IN_MCU)
-constexpr int kNever = 127;          // a step's move that no block position has room for
+constexpr int kFillBits = 3 * kStepBits;  // three steps between fills
+static_assert(kFillBits <= 57, "a fill tops the buffer up by whole bytes");
+constexpr int kNever = 127;          // a step's room that no block position has
 
 // How far an AC symbol moves along the block: 0 for the end of block, 16 for a run of
 // sixteen zeros, else its run of zeros and its own coefficient.
@@ -58,9 +60,10 @@ struct HuffTable {
   std::array<uint8_t, 256> huffval;
   // AC tables: step[] is indexed by the next kStepBits bits and says what they hold:
   //   bits 0-3   bits taken by the whole symbols at the front; 0 when none fits
-  //   bit 4      the last of them is the end of block
-  //   bits 5-11  how far they move along the block (kNever when none fits)
-  // They apply at block position k when k + move + end <= 64.
+  //   bits 4-10  the room they need: how far they move along the block, plus one when
+  //              the last is the end of block (kNever when none fits); they apply at
+  //              block position k when k + room <= 64
+  //   bit 11     the last of them is the end of block
   std::unique_ptr<uint16_t[]> step;
   HuffSource made_from;  // unset while nothing usable is made
 
@@ -145,8 +148,8 @@ void HuffTable::MakeSteps(const std::vector<uint16_t>& front) {
       moved += move;
       end = move == 0;
     }
-    if (used == 0) moved = kNever;
-    step[i] = static_cast<uint16_t>(used | static_cast<int>(end) << 4 | moved << 5);
+    const int room = used == 0 ? kNever : moved + (end ? 1 : 0);
+    step[i] = static_cast<uint16_t>(used | room << 4 | static_cast<int>(end) << 11);
   }
 }
 
@@ -157,9 +160,9 @@ class BitReader {
  public:
   BitReader(const uint8_t* p, const uint8_t* end) : p_(p), end_(end) {}
 
-  // At least 33 bits in the buffer afterwards.
+  // At least kFillBits bits in the buffer afterwards.
   DCLUMA_INLINE void Fill() {
-    while (count_ <= 32) {
+    while (count_ < kFillBits) {
       if (end_ - p_ < 8 || stopped_) {
         // On a copy: were this object's address to escape, its state would live in memory.
         BitReader copy = *this;
@@ -308,28 +311,39 @@ DCLUMA_INLINE bool SkipDc(BitReader& bits, const HuffTable& table) {
   return true;
 }
 
+// Takes one step of AC symbols at block position *k if the block has room for it: +1 when
+// the block goes on, 0 when it ended, -1 when the step does not apply (the symbol at the
+// front is long, or the block's end is near) and nothing was taken.
+DCLUMA_INLINE int TakeStep(BitReader& bits, const HuffTable& table, int* k) {
+  const int step = table.step[bits.Peek(kStepBits)];
+  const int room = step >> 4 & 0x7F;
+  if (*k + room > DCTSIZE2) return -1;
+  bits.Skip(step & 0xF);
+  if ((step & 0x800) != 0) return 0;
+  *k += room;
+  return *k < DCTSIZE2 ? 1 : 0;
+}
+
 // Skips one block's AC coefficients: runs of whole symbols at a time while the block has
 // room for them, one symbol at a time near its end.
 DCLUMA_INLINE bool SkipAc(BitReader& bits, const HuffTable& table) {
   int k = 1;
-  while (k < DCTSIZE2) {
+  for (;;) {
     bits.Fill();
-    const int step = table.step[bits.Peek(kStepBits)];
-    const int end = step >> 4 & 1, moved = step >> 5;
-    if (k + moved + end <= DCTSIZE2) {
-      bits.Skip(step & 0xF);
-      if (end != 0) return true;
-      k += moved;
-      continue;
-    }
+    int taken = TakeStep(bits, table, &k);
+    if (taken > 0) taken = TakeStep(bits, table, &k);
+    if (taken > 0) taken = TakeStep(bits, table, &k);
+    if (taken > 0) continue;
+    if (taken == 0) return true;
+    bits.Fill();
     const int symbol = DecodeSymbol(bits, table);
     if (symbol < 0) return false;
     bits.Skip(symbol & 15);
     const int move = Advance(symbol);
     if (move == 0) return true;
     k += move;
+    if (k >= DCTSIZE2) return true;
   }
-  return true;
 }
 
 // libjpeg's post-IDCT range limit: x & 1023 looked up in a table that clamps to 0..255
