@@ -433,11 +433,6 @@ bool DcLumaDecoder::Decode(const jpeg_decompress_struct& cinfo, uint8_t* out, in
   if (y.h_samp_factor != cinfo.max_h_samp_factor || y.v_samp_factor != cinfo.max_v_samp_factor) {
     return false;
   }
-  const JQUANT_TBL* quant = y.quant_tbl_no >= 0 && y.quant_tbl_no < NUM_QUANT_TBLS
-                                ? cinfo.quant_tbl_ptrs[y.quant_tbl_no]
-                                : nullptr;
-  if (quant == nullptr) return false;
-  const int q = quant->quantval[0];
   const int out_width = static_cast<int>((cinfo.image_width + 7) / 8);
   const int out_height = static_cast<int>((cinfo.image_height + 7) / 8);
   if (width != out_width || height != out_height) return false;
@@ -451,6 +446,7 @@ bool DcLumaDecoder::Decode(const jpeg_decompress_struct& cinfo, uint8_t* out, in
   ScanComponent scan[MAX_COMPS_IN_SCAN];
   int blocks_in_mcu = 0;
   bool tables = true;  // every table is made; all are asked for, so that all count as seen
+  int lumas = 0;
   ++tables_->frame;
   for (int i = 0; i < cinfo.comps_in_scan; ++i) {
     const jpeg_component_info* c = cinfo.cur_comp_info[i];
@@ -460,7 +456,8 @@ bool DcLumaDecoder::Decode(const jpeg_decompress_struct& cinfo, uint8_t* out, in
       return false;
     }
     ScanComponent& s = scan[i];
-    s.luma = c == &cinfo.comp_info[0];
+    s.luma = c == &y;
+    lumas += s.luma ? 1 : 0;
     s.blocks_wide = grey ? 1 : c->h_samp_factor;
     s.blocks_high = grey ? 1 : c->v_samp_factor;
     s.dc = tables_->Get(cinfo, c->dc_tbl_no, true);
@@ -468,7 +465,8 @@ bool DcLumaDecoder::Decode(const jpeg_decompress_struct& cinfo, uint8_t* out, in
     tables = tables && s.dc != nullptr && s.ac != nullptr;
     blocks_in_mcu += s.blocks_wide * s.blocks_high;
   }
-  if (!tables || blocks_in_mcu > kMaxBlocksInMcu) return false;
+  if (!tables || lumas != 1 || blocks_in_mcu > kMaxBlocksInMcu) return false;
+  const int q = cinfo.quant_tbl_ptrs[y.quant_tbl_no]->quantval[0];
   const int mcu_wide = grey ? 1 : cinfo.max_h_samp_factor;  // luma blocks per MCU across
   const int mcu_high = grey ? 1 : cinfo.max_v_samp_factor;
   const int mcus_per_row = (out_width + mcu_wide - 1) / mcu_wide;
