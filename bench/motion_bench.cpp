@@ -247,10 +247,13 @@ class Engine : public Detector {
   std::vector<MD_RECT> ranges_;  // those of the engine's clip
 };
 
-// libjpeg-turbo alone: the decode that the engine does, and nothing else.
+// A decoder alone, doing nothing else: libjpeg-turbo at 1/denominator scale (the floor),
+// or fast mode's DcLumaDecoder after libjpeg has read the header.
 class Floor : public Detector {
  public:
-  explicit Floor(int denominator) : denominator_(denominator) {
+  enum Decoder { kLibrary, kDcLuma };
+  Floor(int denominator, Decoder decoder = kLibrary)
+      : denominator_(denominator), decoder_(decoder) {
     SetJpegExit(&cinfo_, &error_);
     jpeg_CreateDecompress(&cinfo_, JPEG_LIB_VERSION, sizeof(cinfo_));
   }
@@ -261,9 +264,13 @@ class Floor : public Detector {
     Decode(frame);
     return false;
   }
+  // Frames DcLumaDecoder left undecoded: only the first is expected (its Huffman tables
+  // are new; they are made when the second frame brings them again).
+  long Refused() const { return refused_; }
 
  private:
   void Decode(const std::string& frame) {
+    error_.mgr.num_warnings = 0;
     if (setjmp(error_.jump) != 0) {
       jpeg_abort_decompress(&cinfo_);
       return;
@@ -273,9 +280,18 @@ class Floor : public Detector {
     cinfo_.scale_num = 1;
     cinfo_.scale_denom = static_cast<unsigned int>(denominator_);
     cinfo_.out_color_space = JCS_GRAYSCALE;
-    jpeg_start_decompress(&cinfo_);
+    jpeg_calc_output_dimensions(&cinfo_);
     const size_t bytes = static_cast<size_t>(cinfo_.output_width) * cinfo_.output_height;
     if (pixels_.size() < bytes) pixels_.resize(bytes);
+    if (decoder_ == kDcLuma) {
+      if (!dc_luma_.Decode(cinfo_, pixels_.data(), static_cast<int>(cinfo_.output_width),
+                           static_cast<int>(cinfo_.output_height))) {
+        ++refused_;
+      }
+      jpeg_abort_decompress(&cinfo_);
+      return;
+    }
+    jpeg_start_decompress(&cinfo_);
     while (cinfo_.output_scanline < cinfo_.output_height) {
       JSAMPROW row =
           pixels_.data() + static_cast<size_t>(cinfo_.output_scanline) * cinfo_.output_width;
@@ -285,50 +301,10 @@ class Floor : public Detector {
   }
 
   const int denominator_;
+  const Decoder decoder_;
   JpegErrorJump error_;
   jpeg_decompress_struct cinfo_;
-  std::vector<uint8_t> pixels_;
-};
-
-// Fast mode's decoder alone: the header read by libjpeg, the scan by DcLumaDecoder.
-class DcFloor : public Detector {
- public:
-  DcFloor() {
-    SetJpegExit(&cinfo_, &error_);
-    jpeg_CreateDecompress(&cinfo_, JPEG_LIB_VERSION, sizeof(cinfo_));
-  }
-  ~DcFloor() override { jpeg_destroy_decompress(&cinfo_); }
-
-  void Begin(const Clip&) override {}
-  bool Judge(const std::string& frame) override {
-    if (!Decode(frame)) ++refused_;
-    return false;
-  }
-  // Frames the decoder left to the library: only the first is expected (its Huffman
-  // tables are new; they are made when the second frame brings them again).
-  long Refused() const { return refused_; }
-
- private:
-  bool Decode(const std::string& frame) {
-    error_.mgr.num_warnings = 0;
-    if (setjmp(error_.jump) != 0) {
-      jpeg_abort_decompress(&cinfo_);
-      return false;
-    }
-    JpegMemSrc(&cinfo_, reinterpret_cast<const unsigned char*>(frame.data()), frame.size());
-    jpeg_read_header(&cinfo_, TRUE);
-    const int width = static_cast<int>((cinfo_.image_width + 7) / 8);
-    const int height = static_cast<int>((cinfo_.image_height + 7) / 8);
-    const size_t bytes = static_cast<size_t>(width) * height;
-    if (pixels_.size() < bytes) pixels_.resize(bytes);
-    const bool taken = decoder_.Decode(cinfo_, pixels_.data(), width, height);
-    jpeg_abort_decompress(&cinfo_);
-    return taken;
-  }
-
-  JpegErrorJump error_;
-  jpeg_decompress_struct cinfo_;
-  DcLumaDecoder decoder_;
+  DcLumaDecoder dc_luma_;
   std::vector<uint8_t> pixels_;
   long refused_ = 0;
 };
@@ -477,7 +453,7 @@ void SpeedTable() {
     const Clip clip = MakeClip(moving, r, 7, kSpeedFrames);
     Engine fast(true), normal(false);
     Floor eighth(8), quarter(4);
-    DcFloor dc;
+    Floor dc(8, Floor::kDcLuma);
     std::vector<Detector*> detectors = {&eighth, &dc, &fast, &quarter, &normal};
 #ifdef EVW_HAVE_OPENCV
     OpenCvPipeline customary(21), light(5);

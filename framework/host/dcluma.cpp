@@ -240,16 +240,9 @@ class BitReader {
   bool stopped_ = false;
 };
 
+// Byte by byte: Fill() comes here only near the end of the data or at a marker.
 void BitReader::FillBytes() {
   while (count_ <= 56) {
-    if (!stopped_ && end_ - p_ >= 8) {
-      const uint64_t w = Load(p_);
-      const int bytes = std::min((64 - count_) >> 3, BytesBeforeFF(w));
-      if (bytes > 0) {
-        Take(w, bytes);
-        continue;
-      }
-    }
     uint64_t byte = 0;
     if (stopped_ || p_ >= end_) {
       stopped_ = true;

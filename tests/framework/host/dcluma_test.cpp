@@ -22,6 +22,7 @@ struct Outcome {
   bool taken = false;    // the decoder decoded the frame
   bool library = false;  // the library decoded it without an error or warning
   int width = 0, height = 0;
+  int luma_h = 0, luma_v = 0;  // the luminance's sampling factors in the header
   std::vector<uint8_t> ours, theirs;
 };
 
@@ -58,6 +59,8 @@ class Decompressor {
     cinfo_.scale_denom = 8;
     cinfo_.out_color_space = JCS_GRAYSCALE;
     jpeg_calc_output_dimensions(&cinfo_);
+    o->luma_h = cinfo_.comp_info[0].h_samp_factor;
+    o->luma_v = cinfo_.comp_info[0].v_samp_factor;
     o->width = static_cast<int>(cinfo_.output_width);
     o->height = static_cast<int>(cinfo_.output_height);
     o->header = true;
@@ -133,7 +136,11 @@ TEST_F(DcLumaTest, EqualsLibraryAtEverySamplingAndOddSizes) {
       options.luma_v = sampling[1];
       SCOPED_TRACE(std::to_string(size[0]) + "x" + std::to_string(size[1]) + " sampling " +
                    std::to_string(sampling[0]) + "x" + std::to_string(sampling[1]));
-      ExpectSame(SceneJpeg(size[0], size[1], options));
+      const std::string jpeg = SceneJpeg(size[0], size[1], options);
+      ExpectSame(jpeg);
+      const Outcome o = Run(jpeg);
+      EXPECT_EQ(o.luma_h, sampling[0]);
+      EXPECT_EQ(o.luma_v, sampling[1]);
     }
   }
 }
