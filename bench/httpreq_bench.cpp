@@ -11,7 +11,7 @@
 
 #include "framework/host/camera.h"
 #include "framework/httpreq.h"
-#include "sim/httpserver.h"
+#include "sim/net/httpserver.h"
 
 namespace {
 

@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "detectors/media/jpghdrdetector.h"
-#include "sim/mjpeg.h"
+#include "sim/scene/mjpeg.h"
 
 namespace {
 

@@ -34,10 +34,10 @@
 #include <string>
 #include <vector>
 
-#include "framework/host/dcluma.h"
+#include "host/jpeg/dcluma.h"
 #include "framework/host/jpegsrc.h"
 #include "framework/host/mdengine.h"
-#include "sim/scene.h"
+#include "sim/scene/scene.h"
 
 #ifdef EVW_HAVE_OPENCV
 #include <opencv2/core.hpp>

@@ -22,7 +22,7 @@
 #include "framework/host/camera.h"
 #include "framework/host/cameraapi.h"
 #include "framework/host/eventbuf.h"
-#include "sim/httpserver.h"
+#include "sim/net/httpserver.h"
 
 namespace {
 

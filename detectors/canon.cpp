@@ -16,7 +16,6 @@ const char kInfoPath[] = "/-wvhttp-01-/info.cgi";
 const int kResponseSize = 4096;
 const int kLineSize = 256;
 const int kMaxLines = 100;
-const int kPeriod = 1000000;
 const int kTimeout = 30;
 
 // GET path and read the camera's text/plain answer, up to 4096 bytes, into buffer.
@@ -75,12 +74,8 @@ int CanonMD::DoMD(bool& state, unsigned int& level) {
 
 int CanonMD::EventDetecor() {
   if (camera_ == nullptr) return 0;
-  RunPolledLoop(*this, event_buffer_, kPeriod, [this] {
-    bool state = false;
-    unsigned int level = 0;
-    int result = DoMD(state, level);
-    return MotionReport(result, state, level);
-  });
+  RunMotionPolledLoop(*this, event_buffer_, kOneSecond,
+                      [this](bool& state, unsigned int& level) { return DoMD(state, level); });
   return 0;
 }
 
@@ -98,10 +93,7 @@ int CanonEID::DoEID(bool& state) {
 
 int CanonEID::EventDetecor() {
   if (camera_ == nullptr) return 0;
-  RunPolledLoop(*this, event_buffer_, kPeriod, [this] {
-    bool state = false;
-    int result = DoEID(state);
-    return InputReport(result, state);
-  });
+  RunInputPolledLoop(*this, event_buffer_, kOneSecond,
+                     [this](bool& state) { return DoEID(state); });
   return 0;
 }

@@ -10,7 +10,6 @@ namespace {
 
 const char kMotionListPath[] = "cgi-bin/view/list_param.cgi?Action=List&Group=MotionDetect";
 const int kLineSize = 1024;
-const int kPeriod = 1000000;
 const int kTimeout = 10;
 
 // Reads the answer's first line; `motion` says whether it begins with "Region:0".
@@ -41,11 +40,7 @@ int COMPROMD::DoMD(bool& state, unsigned int& level) {
 
 int COMPROMD::EventDetecor() {
   if (camera_ == nullptr) return 0;
-  RunPolledLoop(*this, event_buffer_, kPeriod, [this] {
-    bool state = false;
-    unsigned int level = 0;
-    int result = DoMD(state, level);
-    return MotionReport(result, state, level);
-  });
+  RunMotionPolledLoop(*this, event_buffer_, kOneSecond,
+                      [this](bool& state, unsigned int& level) { return DoMD(state, level); });
   return 0;
 }

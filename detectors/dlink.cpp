@@ -15,7 +15,6 @@ namespace {
 const char kNotifyPath[] = "config/notify.cgi";
 const int kLineSize = 1024;
 const int kMaxInputLines = 10;
-const int kInputPeriod = 1000000;
 const int kTimeout = 10;
 
 // What one notify.cgi request found.
@@ -73,12 +72,8 @@ int DLinkMD::DoMD(bool& state, unsigned int& level) {
 }
 
 int DLinkMD::EventDetecor() {
-  RunPolledLoop(*this, event_buffer_, interval_ * 1000, [this] {
-    bool state = false;
-    unsigned int level = 0;
-    int result = DoMD(state, level);
-    return MotionReport(result, state, level);
-  });
+  RunMotionPolledLoop(*this, event_buffer_, IntervalMicros(),
+                      [this](bool& state, unsigned int& level) { return DoMD(state, level); });
   return 0;
 }
 
@@ -102,10 +97,7 @@ int DLINKEID::DoEID(bool& state) {
 
 int DLINKEID::EventDetecor() {
   if (camera_ == nullptr) return 0;
-  RunPolledLoop(*this, event_buffer_, kInputPeriod, [this] {
-    bool state = false;
-    int result = DoEID(state);
-    return InputReport(result, state);
-  });
+  RunInputPolledLoop(*this, event_buffer_, kOneSecond,
+                     [this](bool& state) { return DoEID(state); });
   return 0;
 }

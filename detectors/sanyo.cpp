@@ -9,7 +9,6 @@
 namespace {
 
 const int kRecordSize = 48;
-const int kPeriod = 1000000;
 const int kEventLevel = 100;
 
 // Which byte of the status record a request gives.
@@ -56,12 +55,8 @@ int SanyoMD::DoMD(bool& state, unsigned int& level) {
 
 int SanyoMD::EventDetecor() {
   if (camera_ == nullptr) return 0;
-  RunPolledLoop(*this, event_buffer_, kPeriod, [this] {
-    bool state = false;
-    unsigned int level = 0;
-    int result = DoMD(state, level);
-    return MotionReport(result, state, level);
-  });
+  RunMotionPolledLoop(*this, event_buffer_, kOneSecond,
+                      [this](bool& state, unsigned int& level) { return DoMD(state, level); });
   return 0;
 }
 
@@ -92,11 +87,7 @@ int SanyoEID::DoEID(bool& state, unsigned int& level) {
 }
 
 int SanyoEID::EventDetecor() {
-  RunPolledLoop(*this, event_buffer_, kPeriod, [this] {
-    bool state = false;
-    unsigned int level = 0;
-    int result = DoEID(state, level);
-    return MotionReport(result, state, level);
-  });
+  RunMotionPolledLoop(*this, event_buffer_, kOneSecond,
+                      [this](bool& state, unsigned int& level) { return DoEID(state, level); });
   return 0;
 }

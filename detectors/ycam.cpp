@@ -50,11 +50,7 @@ int YCAMMD::DoMD(bool& state, unsigned int& level) {
 }
 
 int YCAMMD::EventDetecor() {
-  RunPolledLoop(*this, event_buffer_, interval_ * 1000, [this] {
-    bool state = false;
-    unsigned int level = 0;
-    int result = DoMD(state, level);
-    return MotionReport(result, state, level);
-  });
+  RunMotionPolledLoop(*this, event_buffer_, IntervalMicros(),
+                      [this](bool& state, unsigned int& level) { return DoMD(state, level); });
   return 0;
 }

@@ -19,7 +19,19 @@
 
 #include <pthread.h>
 
+#include <climits>
+
 class EventBuf;
+
+// The longest interval, in milliseconds, whose microseconds an int holds (about 35 minutes).
+inline constexpr int kMaxIntervalMillis = INT_MAX / 1000;
+
+// millis in microseconds, saturating at the longest interval: a longer interval waits the
+// longest instead of overflowing.
+inline int MillisToMicros(int millis) {
+  if (millis <= 0) return 0;
+  return millis >= kMaxIntervalMillis ? kMaxIntervalMillis * 1000 : millis * 1000;
+}
 
 class EventDetector {
  public:
@@ -54,6 +66,10 @@ class DetectorBase : public EventDetector {
   // Thread entry: runs detector->EventDetecor() and returns its result.
   static void* DetThreadFunc(void* detector);
 
+  // The bound polling interval in milliseconds, and in microseconds for a pacing timer.
+  int Interval() const { return interval_; }
+  int IntervalMicros() const { return MillisToMicros(interval_); }
+
  protected:
   // Stop() when started; the first step of every concrete destructor.
   void StopIfStarted() {
@@ -64,7 +80,9 @@ class DetectorBase : public EventDetector {
   pthread_mutex_t mutex_;    // guards run_
   EventBuf* event_buffer_;   // where readings go; not owned
   bool run_;                 // true from Start() until Stop()
-  int interval_;             // polling interval in milliseconds
+
+ private:
+  int interval_;  // polling interval in milliseconds; read through Interval()
 };
 
 #endif  // EVWATCH_FRAMEWORK_DETECTOR_H_

@@ -55,13 +55,8 @@ int ScanInputs(Camera* camera, int count, bool& active, Query&& query) {
 template <typename DoEid>
 int RunInputQueryLoop(DetectorBase& detector, EventBuf* buffer, Camera* camera,
                       DoEid&& doEid) {
-  const int kPeriod = 1000000;
   if (camera == nullptr) return 0;
-  RunPolledLoop(detector, buffer, kPeriod, [&] {
-    bool active = false;
-    int result = doEid(active);
-    return InputReport(result, active);
-  });
+  RunInputPolledLoop(detector, buffer, kOneSecond, doEid);
   return 0;
 }
 

@@ -9,6 +9,9 @@
 #include "framework/host/delaytimer.h"
 #include "framework/host/eventbuf.h"
 
+// The pace of the detectors that ask their camera once a second, in microseconds.
+inline constexpr int kOneSecond = 1000000;
+
 // What one pass reports through EventBuf::SetStatus.
 struct PassReport {
   bool state;
@@ -38,6 +41,27 @@ void RunPolledLoop(DetectorBase& detector, EventBuf* buffer, int period, Pass&& 
     timer.Delay();
   }
   buffer->SetStatus(false, 0);
+}
+
+// RunPolledLoop with a motion pass: doMD(state, level) returns 0 for a reading.
+template <typename DoMD>
+void RunMotionPolledLoop(DetectorBase& detector, EventBuf* buffer, int period, DoMD&& doMD) {
+  RunPolledLoop(detector, buffer, period, [&] {
+    bool state = false;
+    unsigned int level = 0;
+    int result = doMD(state, level);
+    return MotionReport(result, state, level);
+  });
+}
+
+// RunPolledLoop with an input pass: doEID(state) returns 0 for a reading.
+template <typename DoEID>
+void RunInputPolledLoop(DetectorBase& detector, EventBuf* buffer, int period, DoEID&& doEID) {
+  RunPolledLoop(detector, buffer, period, [&] {
+    bool state = false;
+    int result = doEID(state);
+    return InputReport(result, state);
+  });
 }
 
 #endif  // EVWATCH_FRAMEWORK_POLLEDLOOP_H_

@@ -14,7 +14,7 @@
 #include <utility>
 #include <vector>
 
-#include "sim/httpserver.h"
+#include "sim/net/httpserver.h"
 
 namespace evsim {
 

@@ -17,8 +17,8 @@
 #include <vector>
 
 #include "sim/camstate.h"
-#include "sim/httpserver.h"
-#include "sim/tcpserver.h"
+#include "sim/net/httpserver.h"
+#include "sim/net/tcpserver.h"
 
 namespace evsim {
 

@@ -25,8 +25,8 @@
 
 #include "sim/camstate.h"
 #include "sim/emulation.h"
-#include "sim/httpauth.h"
-#include "sim/httpserver.h"
+#include "sim/net/httpauth.h"
+#include "sim/net/httpserver.h"
 #include "sim/scenario.h"
 
 namespace evsim {

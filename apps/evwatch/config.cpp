@@ -11,6 +11,7 @@
 #include <stdexcept>
 
 #include "apps/evwatch/registry.h"
+#include "framework/detector.h"
 
 namespace evwatch {
 namespace {
@@ -133,6 +134,10 @@ class Parser {
   int Interval(const YAML::Node& node, const std::string& path) {
     int value = Int(node, path);
     if (value < 1) Fail(node, path, "must be at least 1 (milliseconds), not " + std::to_string(value));
+    if (value > kMaxIntervalMillis) {
+      Fail(node, path, "must be at most " + std::to_string(kMaxIntervalMillis) +
+                           " (milliseconds, about 35 minutes), not " + std::to_string(value));
+    }
     return value;
   }
 

@@ -50,7 +50,6 @@ const uint32_t kLiveRequestType = 48;
 const char kTag[] = "ACTi";
 const unsigned long long kLiveRequestPeriod = 19999999;  // microseconds; a request is due past it
 
-const int kInputPeriod = 1000000;
 const int kInputMask = 3;
 
 // Wire integers are little-endian; writing them byte by byte keeps the bytes right on a host
@@ -286,10 +285,7 @@ int ACTiEID::DoEID(bool& active) {
 
 int ACTiEID::EventDetecor() {
   if (camera_ == nullptr || event_buffer_ == nullptr) return 0;
-  RunPolledLoop(*this, event_buffer_, kInputPeriod, [this] {
-    bool active = false;
-    int result = DoEID(active);
-    return InputReport(result, active);
-  });
+  RunInputPolledLoop(*this, event_buffer_, kOneSecond,
+                     [this](bool& state) { return DoEID(state); });
   return 0;
 }

@@ -147,9 +147,7 @@ int JpegDiffMD::EventDetecor() {
   }
 
   DataUnit* previous = nullptr;
-  // The timer takes microseconds; an interval beyond what they can hold waits the longest.
-  const int period = std::min(interval_, INT_MAX / 1000) * 1000;
-  RunPolledLoop(*this, event_buffer_, period, [&]() -> PassReport {
+  RunPolledLoop(*this, event_buffer_, IntervalMicros(), [&]() -> PassReport {
     int level = 0;
     bool state = false;
     DataUnit* unit = buffer != nullptr ? buffer->ReadLatest(previous) : nullptr;

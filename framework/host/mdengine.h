@@ -4,7 +4,7 @@
 // MD_FinishDetection releases what it holds. Each frame is decoded only as far as needed:
 // luminance only, at 1/8 of its size in fast mode (the DC coefficients alone give the
 // picture) or at 1/4 otherwise. Every pixel of that small picture is a cell; see
-// framework/host/framecompare.h for how cells are compared with the reference and why a
+// host/jpeg/framecompare.h for how cells are compared with the reference and why a
 // change of brightness, noise or something that stopped moving is not motion.
 //
 // Settings:
@@ -18,7 +18,7 @@
 //   ranges: the watched area, rectangles in the 0..10000 space of the frame (10000 = the
 //     full width or height); up to MD_MAX_RANGES; the whole frame while none is set.
 //   fast mode (default off): 1/8 scale instead of 1/4: coarser cells, and the picture
-//     comes from the DC coefficients alone, which framework/host/dcluma.h reads without
+//     comes from the DC coefficients alone, which host/jpeg/dcluma.h reads without
 //     decoding the rest; about half the work of normal mode.
 //
 // Threads: one state belongs to one thread at a time; different states are independent.

@@ -16,7 +16,7 @@
 #include "apps/evwatch/runner.h"
 #include "apps/evwatch/sink.h"
 #include "framework/host/streambuffer.h"
-#include "sim/mjpeg.h"
+#include "sim/scene/mjpeg.h"
 #include "tests/support/fakecamera.h"
 
 namespace evwatch {

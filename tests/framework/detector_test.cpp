@@ -26,7 +26,7 @@ class ScriptedDetector : public DetectorBase {
 
   int EventDetecor() override {
     threads_started_++;
-    RunPolledLoop(*this, event_buffer_, interval_ * 1000, [this] { return NextReading(); });
+    RunPolledLoop(*this, event_buffer_, IntervalMicros(), [this] { return NextReading(); });
     return 0;
   }
 
@@ -58,7 +58,6 @@ class ScriptedDetector : public DetectorBase {
 
   std::atomic<int> threads_started_{0};
   EventBuf* Buffer() const { return event_buffer_; }
-  int Interval() const { return interval_; }
 
  private:
   std::mutex mutex_;
@@ -97,6 +96,27 @@ TEST(DetectorBaseTest, InitMayBeCalledAgainBeforeStart) {
   ASSERT_EQ(detector.Init(&second, 200), 0);
   EXPECT_EQ(detector.Buffer(), &second);
   EXPECT_EQ(detector.Interval(), 200);
+}
+
+TEST(DetectorBaseTest, IntervalInMicrosecondsSaturates) {
+  ScriptedDetector detector({});
+  EventBuf buffer;
+  // 3,000,000 ms in microseconds does not fit an int: the conversion stops at the longest.
+  ASSERT_EQ(detector.Init(&buffer, 3000000), 0);
+  EXPECT_EQ(detector.Interval(), 3000000);
+  EXPECT_EQ(detector.IntervalMicros(), kMaxIntervalMillis * 1000);
+  ASSERT_EQ(detector.Init(&buffer, INT_MAX), 0);
+  EXPECT_EQ(detector.IntervalMicros(), kMaxIntervalMillis * 1000);
+  EXPECT_EQ(MillisToMicros(kMaxIntervalMillis + 1), kMaxIntervalMillis * 1000);
+}
+
+TEST(DetectorBaseTest, MillisToMicrosKeepsTheUsualRange) {
+  EXPECT_EQ(kMaxIntervalMillis, 2147483);
+  EXPECT_EQ(MillisToMicros(1), 1000);
+  EXPECT_EQ(MillisToMicros(500), 500000);
+  EXPECT_EQ(MillisToMicros(kMaxIntervalMillis), 2147483000);
+  EXPECT_EQ(MillisToMicros(0), 0);
+  EXPECT_EQ(MillisToMicros(-5), 0);
 }
 
 TEST(DetectorBaseTest, StartWithoutInitFails) {

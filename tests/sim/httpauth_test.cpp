@@ -1,4 +1,4 @@
-#include "sim/httpauth.h"
+#include "sim/net/httpauth.h"
 
 #include <gtest/gtest.h>
 

@@ -1,4 +1,4 @@
-#include "sim/httpserver.h"
+#include "sim/net/httpserver.h"
 
 #include <gtest/gtest.h>
 

@@ -11,7 +11,7 @@
 #include "detectors/media/jpghdrdetector.h"
 #include "framework/host/camera.h"
 #include "framework/host/fetcher.h"
-#include "sim/mjpeg.h"
+#include "sim/scene/mjpeg.h"
 #include "sim/simulator.h"
 
 namespace evsim {

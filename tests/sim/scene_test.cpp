@@ -1,7 +1,7 @@
 // The synthetic scene: deterministic frames, objects that move with Step(), brightness, and
 // JPEG frames of the scene's size.
 
-#include "sim/scene.h"
+#include "sim/scene/scene.h"
 
 #include <gtest/gtest.h>
 

@@ -1,20 +1,15 @@
 #include "tests/support/fakecamera.h"
 
-#include <strings.h>
-
 #include <algorithm>
 #include <atomic>
 #include <utility>
 
-#include "sim/tcpserver.h"
+#include "host/text/strutil.h"
+#include "sim/net/tcpserver.h"
 
 namespace evtest {
 
 namespace {
-
-bool EqualsNoCase(const std::string& a, const std::string& b) {
-  return a.size() == b.size() && strncasecmp(a.data(), b.data(), a.size()) == 0;
-}
 
 void Play(const Reply& reply, evsim::HttpConnection& connection) {
   if (reply.delay.count() > 0 && !connection.SleepFor(reply.delay)) return;

@@ -26,8 +26,8 @@
 #include <vector>
 
 #include "framework/host/camera.h"
-#include "sim/httpauth.h"
-#include "sim/httpserver.h"
+#include "sim/net/httpauth.h"
+#include "sim/net/httpserver.h"
 
 namespace evtest {
 

@@ -20,7 +20,7 @@
 #include "framework/host/eventbuf.h"
 #include "framework/host/fetcher.h"
 #include "framework/host/streambuffer.h"
-#include "sim/scene.h"
+#include "sim/scene/scene.h"
 #include "tests/support/eventrecorder.h"
 #include "tests/support/fakecamera.h"
 

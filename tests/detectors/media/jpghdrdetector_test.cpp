@@ -17,7 +17,7 @@
 #include "framework/host/eventbuf.h"
 #include "framework/host/fetcher.h"
 #include "framework/host/streambuffer.h"
-#include "sim/mjpeg.h"
+#include "sim/scene/mjpeg.h"
 #include "tests/support/eventrecorder.h"
 #include "tests/support/fakecamera.h"
 

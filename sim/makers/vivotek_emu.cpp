@@ -1,0 +1,81 @@
+// Vivotek network cameras: a motion-JPEG stream at /video.mjpg whose frames carry the motion
+// state in two records, one for each firmware generation, so that detectors of either
+// function group read the same stream (each keeps only its own marker's segments):
+//   APP0: "VVTK", then bit 0 of byte 6 set while there is motion and the level in the low
+//         nibble of byte 7 (level = nibble x 6 + 6);
+//   APP2: "VIVO" and the tag "jpeg", 11 bytes later a record count (1), then the record:
+//         a valid bit, a trigger bit and a 7-bit level (0..127), most significant bit first.
+// The frames have no JFIF header: its APP0 would come before the camera's own.
+
+#include <string>
+#include <vector>
+
+#include "sim/emulation.h"
+#include "sim/scene/mjpeg.h"
+
+namespace evsim {
+namespace {
+
+constexpr char kStreamPath[] = "/video.mjpg";
+constexpr int kFps = 10;
+constexpr int kBufferFps = 100;  // the receiver of the frame buffer reads at full speed
+
+std::string App0Record(const CameraStatus& status) {
+  std::string r(16, '\0');
+  r.replace(0, 4, "VVTK");
+  if (status.motion > 0) {
+    r[6] = 0x01;
+    const int nibble = status.motion < 6 ? 0 : (status.motion - 6 + 3) / 6;
+    r[7] = static_cast<char>(nibble > 15 ? 15 : nibble);
+  }
+  return r;
+}
+
+std::string App2Record(const CameraStatus& status) {
+  std::string r = "VIVOjpeg";
+  r += std::string(11, '\0');
+  r += '\x01';  // one record
+  const int level = status.motion * 127 / 100;
+  const bool trigger = status.motion > 0;
+  std::string record(4, '\0');
+  record[0] = static_cast<char>(0x80 | (trigger ? 0x40 : 0) | (level >> 1));
+  record[1] = static_cast<char>((level & 1) << 7);
+  return r + record;
+}
+
+void HandleVivotek(HttpConnection& connection, CameraState& state) {
+  const HttpRequest& request = connection.Request();
+  if (request.method != "GET" || request.Path() != kStreamPath) {
+    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
+    return;
+  }
+  ServeEventFrames(connection, state, FramePeriod(request, kFps), [](const CameraStatus& status) {
+    return std::vector<JpegSegment>{{kJpegApp0, App0Record(status)},
+                                    {kJpegApp2, App2Record(status)}};
+  });
+}
+
+}  // namespace
+
+Emulation VivotekEmulation() {
+  Emulation e;
+  e.key = "vivotek";
+  e.maker = "Vivotek";
+  e.classes = {"VivotekJpgMD"};
+  e.handle = HandleVivotek;
+  // One reader of the camera's own stream (APP0) and one of the frame buffer (APP2).
+  e.detectors = {
+      {"VivotekJpgMD", "motion", {{"function_group", 0}}},
+      {"VivotekJpgMD", "motion-app2", {{"function_group", 1}, {"stream_buffer", true}}},
+  };
+  e.api = [](int port) {
+    return nlohmann::json{{"stream", {{"path", kStreamPath}, {"port", port}}}};
+  };
+  e.frames = [](int port) {
+    return nlohmann::json{
+        {"path", std::string(kStreamPath) + "?fps=" + std::to_string(kBufferFps)}, {"port", port}};
+  };
+  return e;
+}
+
+}  // namespace evsim
