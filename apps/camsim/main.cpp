@@ -18,8 +18,8 @@
 #include <string>
 #include <vector>
 
-#include "apps/evwatch/endwait.h"
-#include "sim/evwatchconfig.h"
+#include "apps/common/endwait.h"
+#include "apps/camsim/simwatch.h"
 #include "sim/simulator.h"
 
 namespace {
@@ -105,15 +105,14 @@ int main(int argc, char** argv) {
     return 1;
   }
   if (!config_file.empty()) {
-    evsim::EvwatchConfigOptions generate;
-    generate.host = options.host;
-    generate.interval = interval;
+    evsim::SimWatchOptions watch;
+    watch.host = options.host;
     if (options.auth != evsim::AuthScheme::kNone) {
-      generate.user = options.user;
-      generate.password = options.password;
+      watch.user = options.user;
+      watch.password = options.password;
     }
     std::ofstream out(config_file);
-    out << evsim::EvwatchConfig(simulator.Cameras(), generate).dump(2) << "\n";
+    out << evwatch::WatchConfig(evsim::SimWatch(simulator.Cameras(), watch), interval).dump(2) << "\n";
     out.close();
     if (!out) {
       std::cerr << "camsim: cannot write " << config_file << std::endl;

@@ -10,6 +10,7 @@
 #include <sstream>
 #include <stdexcept>
 
+#include "apps/common/watchconfig.h"
 #include "apps/evwatch/registry.h"
 #include "framework/detector.h"
 
@@ -49,14 +50,14 @@ class Parser {
     Config config;
     config.file = file_;
     if (!root.IsDefined() || root.IsNull()) Fail(root, "", "the file is empty (it needs a cameras: list)");
-    CheckMap(root, "", {"interval", "cameras"});
-    if (root["interval"]) config.interval = Interval(root["interval"], "interval");
-    const YAML::Node cameras = Required(root, "", "cameras");
-    if (!cameras.IsSequence()) Fail(cameras, "cameras", "expected a list of cameras, found " + TypeName(cameras));
-    if (cameras.size() == 0) Fail(cameras, "cameras", "the list is empty (at least one camera is needed)");
+    CheckMap(root, "", {field::kInterval, field::kCameras});
+    if (root[field::kInterval]) config.interval = Interval(root[field::kInterval], field::kInterval);
+    const YAML::Node cameras = Required(root, "", field::kCameras);
+    if (!cameras.IsSequence()) Fail(cameras, field::kCameras, "expected a list of cameras, found " + TypeName(cameras));
+    if (cameras.size() == 0) Fail(cameras, field::kCameras, "the list is empty (at least one camera is needed)");
     std::set<std::string> names;
     for (size_t i = 0; i < cameras.size(); ++i) {
-      config.cameras.push_back(ParseCamera(cameras[i], Index("cameras", i), static_cast<int>(i) + 1));
+      config.cameras.push_back(ParseCamera(cameras[i], Index(field::kCameras, i), static_cast<int>(i) + 1));
       const CameraConfig& c = config.cameras.back();
       if (!names.insert(c.name).second) {
         Fail(cameras[i]["name"], Field(c.path, "name"), "duplicate camera name " + Quote(c.name));
@@ -162,26 +163,26 @@ class Parser {
 
   CameraConfig ParseCamera(const YAML::Node& node, const std::string& path, int position) {
     CheckMap(node, path,
-             {"name", "host", "port", "user", "password", "id", "channel", "stream_type",
-              "video_type", "api", "motion", "frames", "detectors"});
+             {field::kName, field::kHost, field::kPort, field::kUser, field::kPassword, field::kId, "channel", "stream_type",
+              "video_type", field::kApi, "motion", field::kFrames, field::kDetectors});
     CameraConfig c;
     c.path = path;
-    c.name = NonEmptyString(Required(node, path, "name"), Field(path, "name"));
+    c.name = NonEmptyString(Required(node, path, field::kName), Field(path, field::kName));
     CameraRecord& r = c.record;
-    r.host = NonEmptyString(Required(node, path, "host"), Field(path, "host"));
-    if (node["port"]) r.port = Port(node["port"], Field(path, "port"));
-    if (node["user"]) r.username = String(node["user"], Field(path, "user"));
-    if (node["password"]) r.password = String(node["password"], Field(path, "password"));
-    r.id = node["id"] ? IntIn(node["id"], Field(path, "id"), 0, 1 << 30) : position;
+    r.host = NonEmptyString(Required(node, path, field::kHost), Field(path, field::kHost));
+    if (node[field::kPort]) r.port = Port(node[field::kPort], Field(path, field::kPort));
+    if (node[field::kUser]) r.username = String(node[field::kUser], Field(path, field::kUser));
+    if (node[field::kPassword]) r.password = String(node[field::kPassword], Field(path, field::kPassword));
+    r.id = node[field::kId] ? IntIn(node[field::kId], Field(path, field::kId), 0, 1 << 30) : position;
     if (node["channel"]) r.channel = String(node["channel"], Field(path, "channel"));
     if (node["stream_type"]) r.stream_type = IntIn(node["stream_type"], Field(path, "stream_type"), 0, 1 << 30);
     if (node["video_type"]) r.video_type = IntIn(node["video_type"], Field(path, "video_type"), 0, 1 << 30);
-    if (node["api"]) c.api = ParseApi(node["api"], Field(path, "api"), r.port);
+    if (node[field::kApi]) c.api = ParseApi(node[field::kApi], Field(path, field::kApi), r.port);
     if (node["motion"]) ParseMotion(node["motion"], Field(path, "motion"), &r);
-    if (node["frames"]) c.frames = Location(node["frames"], Field(path, "frames"), r.port);
+    if (node[field::kFrames]) c.frames = Location(node[field::kFrames], Field(path, field::kFrames), r.port);
 
-    const std::string dpath = Field(path, "detectors");
-    const YAML::Node list = Required(node, path, "detectors");
+    const std::string dpath = Field(path, field::kDetectors);
+    const YAML::Node list = Required(node, path, field::kDetectors);
     if (!list.IsSequence()) Fail(list, dpath, "expected a list of detectors, found " + TypeName(list));
     if (list.size() == 0) Fail(list, dpath, "the list is empty (at least one detector is needed)");
     std::set<std::string> names;
@@ -189,9 +190,9 @@ class Parser {
       c.detectors.push_back(ParseDetector(list[i], Index(dpath, i), c));
       const DetectorConfig& d = c.detectors.back();
       if (!names.insert(d.name).second) {
-        Fail(list[i], Field(d.path, "name"),
+        Fail(list[i], Field(d.path, field::kName),
              "duplicate detector name " + Quote(d.name) + " in camera " + Quote(c.name) +
-                 (list[i]["name"] ? "" : " (the name defaults to the class name; give each entry a name)"));
+                 (list[i][field::kName] ? "" : " (the name defaults to the class name; give each entry a name)"));
       }
     }
     return c;
@@ -252,21 +253,21 @@ class Parser {
   }
 
   DetectorConfig ParseDetector(const YAML::Node& node, const std::string& path, const CameraConfig& camera) {
-    CheckMap(node, path, {"class", "name", "interval", "inputs", "function_group", "type", "stream_buffer"});
+    CheckMap(node, path, {field::kClass, field::kName, field::kInterval, "inputs", "function_group", "type", "stream_buffer"});
     DetectorConfig d;
     d.path = path;
-    const YAML::Node cls = Required(node, path, "class");
-    d.cls = String(cls, Field(path, "class"));
+    const YAML::Node cls = Required(node, path, field::kClass);
+    d.cls = String(cls, Field(path, field::kClass));
     const DetectorClass* info = FindDetectorClass(d.cls);
     if (info == nullptr) {
       std::vector<std::string> names;
       for (const DetectorClass& c : DetectorClasses()) names.push_back(c.name);
-      Fail(cls, Field(path, "class"),
+      Fail(cls, Field(path, field::kClass),
            "unknown class " + Quote(d.cls) + " (did you mean " + Quote(NearestName(d.cls, names)) +
                "? `evwatch classes` lists them)");
     }
-    d.name = node["name"] ? NonEmptyString(node["name"], Field(path, "name")) : d.cls;
-    if (node["interval"]) d.interval = Interval(node["interval"], Field(path, "interval"));
+    d.name = node[field::kName] ? NonEmptyString(node[field::kName], Field(path, field::kName)) : d.cls;
+    if (node[field::kInterval]) d.interval = Interval(node[field::kInterval], Field(path, field::kInterval));
 
     auto taken = [&](const char* key, ConfigField field) {
       const YAML::Node value = node[key];

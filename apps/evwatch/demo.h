@@ -1,7 +1,10 @@
-// `evwatch demo`: the whole system with no set-up. Starts the camera simulator in this
-// process on free loopback ports with its demo scenario (motion and inputs change every few
-// seconds), builds the configuration for every registered class that has an emulation,
-// runs it and prints the text format until SIGINT/SIGTERM or the duration.
+// `evwatch demo`: the whole system with no set-up. Runs the camera simulator (the camsim
+// program beside evwatch, or the one that EVWATCH_CAMSIM names, else camsim on the PATH) as
+// a child on free loopback ports with its demo scenario (motion and inputs change every few
+// seconds), takes the configuration it writes for every camera, keeps the registered
+// classes, runs it and prints the text format until SIGINT/SIGTERM or the duration.
+//
+// The simulator is a separate program so that the daemon links none of its code.
 //
 // Threads: call from main's thread after BlockEndSignals().
 

@@ -16,7 +16,7 @@
 
 #include "apps/evwatch/config.h"
 #include "apps/evwatch/demo.h"
-#include "apps/evwatch/endwait.h"
+#include "apps/common/endwait.h"
 #include "apps/evwatch/registry.h"
 #include "apps/evwatch/runner.h"
 #include "apps/evwatch/sink.h"

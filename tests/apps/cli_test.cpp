@@ -77,6 +77,16 @@ TEST(CliTest, DemoShowsEventsAndEndsByItself) {
   }
 }
 
+TEST(CliTest, DemoWithoutItsSimulatorSaysSoAndFails) {
+  Completed done = RunToEnd({"/usr/bin/env", "EVWATCH_CAMSIM=/nonexistent/camsim", EvwatchPath(), "demo",
+                             "--duration", "5"},
+                            std::chrono::seconds(60));
+  EXPECT_EQ(done.status, 1);
+  ASSERT_EQ(done.err.size(), 1u);
+  EXPECT_NE(done.err[0].find("the camera simulator (/nonexistent/camsim) did not start"), std::string::npos)
+      << done.err[0];
+}
+
 TEST(CamsimCliTest, ListsItsEmulations) {
   Completed done = RunToEnd({CamsimPath(), "--list"});
   ASSERT_EQ(done.status, 0);

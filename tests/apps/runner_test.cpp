@@ -11,7 +11,7 @@
 #include <thread>
 
 #include "apps/evwatch/registry.h"
-#include "sim/evwatchconfig.h"
+#include "apps/camsim/simwatch.h"
 #include "sim/simulator.h"
 
 namespace evwatch {
@@ -27,7 +27,7 @@ class RunnerTest : public ::testing::Test {
     ASSERT_TRUE(sim_.Start(options, &error)) << error;
   }
   Config MakeConfig() {
-    nlohmann::ordered_json j = evsim::EvwatchConfig(sim_.Cameras(), {});
+    nlohmann::ordered_json j = WatchConfig(evsim::SimWatch(sim_.Cameras(), {}), 500);
     std::string error;
     std::optional<Config> c = ParseConfig(j.dump(), "sim.json", &error);
     EXPECT_TRUE(c.has_value()) << error;

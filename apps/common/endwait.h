@@ -3,8 +3,8 @@
 // Threads: BlockEndSignals() first thing in main, before any thread exists, so that every
 // later thread inherits the blocked mask and only WaitForEnd() takes those signals.
 
-#ifndef EVWATCH_APPS_EVWATCH_ENDWAIT_H_
-#define EVWATCH_APPS_EVWATCH_ENDWAIT_H_
+#ifndef EVWATCH_APPS_COMMON_ENDWAIT_H_
+#define EVWATCH_APPS_COMMON_ENDWAIT_H_
 
 #include <functional>
 #include <optional>
@@ -23,4 +23,4 @@ EndReason WaitForEnd(std::optional<double> seconds, const std::function<bool()>&
 
 }  // namespace evwatch
 
-#endif  // EVWATCH_APPS_EVWATCH_ENDWAIT_H_
+#endif  // EVWATCH_APPS_COMMON_ENDWAIT_H_

@@ -1,4 +1,4 @@
-#include "apps/evwatch/endwait.h"
+#include "apps/common/endwait.h"
 
 #include <pthread.h>
 #include <signal.h>

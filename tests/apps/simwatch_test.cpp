@@ -1,11 +1,11 @@
-#include "sim/evwatchconfig.h"
+#include "apps/camsim/simwatch.h"
 
 #include <gtest/gtest.h>
 
 namespace evsim {
 namespace {
 
-class EvwatchConfigTest : public ::testing::Test {
+class SimWatchTest : public ::testing::Test {
  protected:
   void SetUp() override {
     SimOptions options;
@@ -17,8 +17,8 @@ class EvwatchConfigTest : public ::testing::Test {
   Simulator sim_;
 };
 
-TEST_F(EvwatchConfigTest, OneCameraEntryPerSimulatedCamera) {
-  nlohmann::ordered_json c = EvwatchConfig(sim_.Cameras(), {});
+TEST_F(SimWatchTest, OneCameraEntryPerSimulatedCamera) {
+  nlohmann::ordered_json c = evwatch::WatchConfig(SimWatch(sim_.Cameras(), {}), 500);
   EXPECT_EQ(c["interval"], 500);
   ASSERT_EQ(c["cameras"].size(), 2u);
   for (size_t i = 0; i < 2; ++i) {
@@ -34,13 +34,12 @@ TEST_F(EvwatchConfigTest, OneCameraEntryPerSimulatedCamera) {
   }
 }
 
-TEST_F(EvwatchConfigTest, KeepsOnlyAcceptedClassesAndCredentials) {
-  EvwatchConfigOptions options;
+TEST_F(SimWatchTest, KeepsOnlyAcceptedClassesAndCredentials) {
+  SimWatchOptions options;
   options.user = "admin";
   options.password = "pw";
-  options.interval = 250;
   options.keep = [](const std::string& cls) { return cls == "CanonEID"; };
-  nlohmann::ordered_json c = EvwatchConfig(sim_.Cameras(), options);
+  nlohmann::ordered_json c = evwatch::WatchConfig(SimWatch(sim_.Cameras(), options), 250);
   EXPECT_EQ(c["interval"], 250);
   ASSERT_EQ(c["cameras"].size(), 2u);
   EXPECT_EQ(c["cameras"][0]["user"], "admin");
@@ -49,10 +48,11 @@ TEST_F(EvwatchConfigTest, KeepsOnlyAcceptedClassesAndCredentials) {
   EXPECT_EQ(c["cameras"][0]["detectors"][0]["class"], "CanonEID");
 }
 
-TEST_F(EvwatchConfigTest, CamerasWithoutEntriesAreLeftOut) {
-  EvwatchConfigOptions options;
+TEST_F(SimWatchTest, CamerasWithoutEntriesAreLeftOut) {
+  SimWatchOptions options;
   options.keep = [](const std::string&) { return false; };
-  EXPECT_TRUE(EvwatchConfig(sim_.Cameras(), options)["cameras"].empty());
+  EXPECT_TRUE(SimWatch(sim_.Cameras(), options).empty());
+  EXPECT_TRUE(evwatch::WatchConfig(SimWatch(sim_.Cameras(), options), 500)["cameras"].empty());
 }
 
 }  // namespace

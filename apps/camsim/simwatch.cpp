@@ -1,0 +1,33 @@
+#include "apps/camsim/simwatch.h"
+
+namespace evsim {
+
+std::vector<evwatch::WatchedCamera> SimWatch(const std::vector<SimCamera>& cameras,
+                                             const SimWatchOptions& options) {
+  std::vector<evwatch::WatchedCamera> list;
+  for (const SimCamera& camera : cameras) {
+    evwatch::WatchedCamera c;
+    for (const DetectorEntry& entry : camera.emulation->detectors) {
+      if (!options.keep || options.keep(entry.cls)) {
+        c.detectors.push_back({entry.cls, entry.name, entry.fields});
+      }
+    }
+    if (c.detectors.empty()) continue;
+    c.name = camera.name;
+    c.host = options.host;
+    c.port = camera.port;
+    c.user = options.user;
+    c.password = options.password;
+    if (camera.emulation->api) c.api = camera.emulation->api(camera.port);
+    if (camera.emulation->frames) {
+      // The frame buffer's shared-memory key follows the camera id: the port, unique among
+      // the simulators running on this host, keeps two evwatch runs from sharing a key.
+      c.id = camera.port;
+      c.frames = camera.emulation->frames(camera.port);
+    }
+    list.push_back(std::move(c));
+  }
+  return list;
+}
+
+}  // namespace evsim
