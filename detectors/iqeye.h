@@ -11,23 +11,12 @@
 #ifndef EVWATCH_DETECTORS_IQEYE_H_
 #define EVWATCH_DETECTORS_IQEYE_H_
 
-#include "framework/detector.h"
+#include "framework/motiondata.h"
 
-class Camera;
-class MultipartFetch;
-
-class IQeyeV2MD : public DetectorBase {
+class IQeyeV2MD : public MotionDataMD {
  public:
   explicit IQeyeV2MD(Camera* camera);
   ~IQeyeV2MD() override;
-
-  // Reads one part and judges it. 0 when a part was read and judged, -1 otherwise (no
-  // fetcher, a failed read, no room for the part); motion and level are false and 0 then.
-  int DoMD(MultipartFetch* fetch, bool& motion, unsigned int& level);
-  int EventDetecor() override;
-
- private:
-  Camera* camera_;  // not owned
 };
 
 #endif  // EVWATCH_DETECTORS_IQEYE_H_

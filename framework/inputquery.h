@@ -4,7 +4,7 @@
 //
 // The classes differ only in the path prefix and in the request routine: AVIPC and AirLive
 // use the shared SendHttpReqAndCheckResp, Axis and Zavio SendHttpReqAndCheckLine below. The
-// scan and the loop are written here once; each class keeps its own members that call them.
+// machine is InputQueryEID; each maker's class is that machine with its own prefix and check.
 //
 // Threads: everything here runs on the calling detector's worker thread; nothing is shared.
 
@@ -14,11 +14,8 @@
 #include <string>
 
 #include "framework/detector.h"
-#include "framework/host/textutil.h"
-#include "framework/polledloop.h"
 
 class Camera;
-class EventBuf;
 
 // The Axis-family request routine: true when, within the first 10 lines of the camera's text
 // answer to path (empty lines counted), a line's key begins with `key` and its value begins
@@ -27,37 +24,35 @@ class EventBuf;
 bool SendHttpReqAndCheckLine(Camera* camera, std::string path, std::string key,
                              std::string value);
 
-// One input's question: GET prefix + N and look for the key "input" + N with the value
-// "active". `routine` is SendHttpReqAndCheckLine or SendHttpReqAndCheckResp. A failed request
-// counts as not active. Returns 0.
-template <typename Routine>
-int QueryInput(Camera* camera, const char* prefix, int input, bool& active, Routine routine) {
-  const std::string number = itos(input);
-  active = routine(camera, prefix + number, "input" + number, "active") != 0;
-  return 0;
-}
+// Which check reads an input's answer.
+enum class InputAnswerCheck {
+  kLine,      // SendHttpReqAndCheckLine, the Axis-family line check
+  kKeyValue,  // SendHttpReqAndCheckResp, the shared key/value check
+};
 
-// Asks inputs 1..count in order through query(input, active) and stops at the first that
-// leaves `active` true. -1 without a camera, else 0 (a count below 1 asks nothing).
-template <typename Query>
-int ScanInputs(Camera* camera, int count, bool& active, Query&& query) {
-  if (camera == nullptr) return -1;
-  active = false;
-  for (int input = 1; input <= count; ++input) {
-    query(input, active);
-    if (active) break;
-  }
-  return 0;
-}
+// The family's input detector, written once; each maker's class names its path prefix and
+// its check. Once a second it asks inputs 1..inputs in order (GET prefix + N, looking for
+// the key "input" + N with the value "active") and stops at the first active one.
+class InputQueryEID : public DetectorBase {
+ public:
+  // Asks inputs 1..inputs in order and stops at the first active one. An input whose
+  // request fails counts as not active. -1 without a camera, else 0 (a count below 1 asks
+  // nothing).
+  int DoEID(bool& active);
+  // Asks about one input and sets `active`. Returns 0.
+  int QueryCamera(int input, bool& active);
+  // Asks once a second; without a camera it ends at once and reports nothing.
+  int EventDetecor() override;
 
-// The input detectors' worker loop: nothing at all without a camera, else a reading per
-// second through doEid(active), reported with validity 1 (or (false, 0) when it failed).
-template <typename DoEid>
-int RunInputQueryLoop(DetectorBase& detector, EventBuf* buffer, Camera* camera,
-                      DoEid&& doEid) {
-  if (camera == nullptr) return 0;
-  RunInputPolledLoop(detector, buffer, kOneSecond, doEid);
-  return 0;
-}
+ protected:
+  // `inputs`: how many inputs to ask, counted from 1. `prefix` is a string literal.
+  InputQueryEID(Camera* camera, int inputs, const char* prefix, InputAnswerCheck check);
+
+ private:
+  Camera* camera_;  // not owned
+  int inputs_;
+  const char* prefix_;
+  InputAnswerCheck check_;
+};
 
 #endif  // EVWATCH_FRAMEWORK_INPUTQUERY_H_

@@ -52,3 +52,28 @@ int ScanMotionLines(const char* body, int length, unsigned int& level, MotionLin
   if (idle == IdleLevel::kLargest) level = largest;
   return 0;
 }
+
+MotionDataMD::MotionDataMD(Camera* camera, CameraAPI* api, Shape shape)
+    : camera_(camera), api_(api), shape_(shape) {}
+
+int MotionDataMD::DoMD(MultipartFetch* fetch, bool& motion, unsigned int& level) {
+  return ReadMotionPart(fetch, motion, level, [this](char* body, int length, unsigned int& found) {
+    return IsMotionDetected(body, length, found) == 1;
+  });
+}
+
+int MotionDataMD::IsMotionDetected(char* body, int length, unsigned int& level) {
+  return ScanMotionLines(body, length, level, shape_.format, shape_.idle);
+}
+
+int MotionDataMD::EventDetecor() {
+  auto doMD = [this](MultipartFetch* fetch, bool& motion, unsigned int& level) {
+    return DoMD(fetch, motion, level);
+  };
+  if (shape_.fixed_path != nullptr) {
+    RunFixedMotionDataLoop(*this, event_buffer_, camera_, shape_.fixed_path, doMD);
+  } else {
+    RunApiMotionDataLoop(*this, event_buffer_, camera_, api_, doMD);
+  }
+  return 0;
+}

@@ -73,4 +73,35 @@ void RunFixedMotionDataLoop(DetectorBase& detector, EventBuf* buffer, Camera* ca
   RunMotionStreamLoop(detector, buffer, *camera, path, camera->GetPort(), doMD);
 }
 
+// The family's motion-data detector, written once; each maker's class names its line
+// format, its idle level and where its stream is. A part is motion when some line's level is
+// above its threshold; the level reported is that line's, or without motion the idle level.
+class MotionDataMD : public DetectorBase {
+ public:
+  // Reads one part and judges it. 0 when a part was read and judged, -1 otherwise (no
+  // fetcher, a failed read, no room for the part); motion and level are false and 0 then.
+  virtual int DoMD(MultipartFetch* fetch, bool& motion, unsigned int& level);
+  // Scans one part body: 1 when a line's level is above its threshold, with that level;
+  // else 0 with the idle level. A negative length returns 0 and leaves a last-line `level`
+  // alone.
+  int IsMotionDetected(char* body, int length, unsigned int& level);
+  // Follows the stream until stopped; without a camera (or, for a stream the API names,
+  // without an API or its stream) it ends at once and reports nothing.
+  int EventDetecor() override;
+
+ protected:
+  struct Shape {
+    MotionLineFormat format;
+    IdleLevel idle;
+    const char* fixed_path;  // the stream's path on the camera's port; null: the API's stream
+  };
+  MotionDataMD(Camera* camera, CameraAPI* api, Shape shape);
+
+  Camera* camera_;  // not owned
+  CameraAPI* api_;  // not owned; may be null for a fixed path
+
+ private:
+  Shape shape_;
+};
+
 #endif  // EVWATCH_FRAMEWORK_MOTIONDATA_H_

@@ -1,6 +1,7 @@
 #include "sim/emulation.h"
 
 #include <algorithm>
+#include <utility>
 
 namespace evsim {
 
@@ -46,6 +47,43 @@ const std::vector<Emulation>& Emulations() {
       ZavioEmulation(),
   };
   return table;
+}
+
+Emulation MakeEmulation(std::string key, std::string maker,
+                        std::function<void(HttpConnection&, CameraState&)> handle,
+                        std::vector<DetectorEntry> detectors) {
+  Emulation e;
+  e.key = std::move(key);
+  e.maker = std::move(maker);
+  e.handle = std::move(handle);
+  for (const DetectorEntry& d : detectors) {
+    if (std::find(e.classes.begin(), e.classes.end(), d.cls) == e.classes.end()) e.classes.push_back(d.cls);
+  }
+  e.detectors = std::move(detectors);
+  return e;
+}
+
+std::function<nlohmann::json(int port)> StreamApi(std::string path, std::string name) {
+  return [path, name](int port) {
+    nlohmann::json api = {{"stream", {{"path", path}, {"port", port}}}};
+    if (!name.empty()) api["name"] = name;
+    return api;
+  };
+}
+
+std::function<nlohmann::json(int port)> FramesAt(std::string path) {
+  return [path](int port) { return nlohmann::json{{"path", path}, {"port", port}}; };
+}
+
+void AnswerNotFound(HttpConnection& connection) {
+  connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
+}
+
+bool ServesGetOf(HttpConnection& connection, std::string_view path) {
+  const HttpRequest& request = connection.Request();
+  if (request.method == "GET" && request.Path() == path) return true;
+  AnswerNotFound(connection);
+  return false;
 }
 
 const Emulation* FindEmulation(std::string_view key) {

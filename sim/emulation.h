@@ -60,6 +60,26 @@ struct Emulation {
   std::function<void(HttpConnection&, CameraState&, int tcp_port)> handle_with_tcp_port;
 };
 
+// An emulation whose classes are those of its detector entries, in the order they first come.
+Emulation MakeEmulation(std::string key, std::string maker,
+                        std::function<void(HttpConnection&, CameraState&)> handle,
+                        std::vector<DetectorEntry> detectors);
+
+// An `api:` block (for Emulation::api) naming the stream at `path` on the camera's own port,
+// and the API's name when `name` is not empty.
+std::function<nlohmann::json(int port)> StreamApi(std::string path, std::string name = "");
+
+// A `frames:` block (for Emulation::frames): the multipart source at `path` on the camera's
+// own port.
+std::function<nlohmann::json(int port)> FramesAt(std::string path);
+
+// What a camera answers for a request it does not serve: 404, "not found".
+void AnswerNotFound(HttpConnection& connection);
+
+// True when the request is a GET of `path` (the target without its query), for the caller to
+// answer; else answers it with AnswerNotFound and returns false.
+bool ServesGetOf(HttpConnection& connection, std::string_view path);
+
 // Every emulation, in a fixed order.
 const std::vector<Emulation>& Emulations();
 // The emulation of that key (exact match), or null.

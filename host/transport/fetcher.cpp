@@ -114,6 +114,7 @@ class MultipartStream {
   int Fail();
   void Close();
   bool NextPiece(std::string* piece);
+  bool NextClassified(std::string* piece, LineKind* kind);
   LineKind Classify(std::string_view piece);
   bool SkipToBoundary(std::string* text);
   bool ReadHeaderLines();
@@ -215,6 +216,14 @@ bool MultipartStream::NextPiece(std::string* piece) {
   }
 }
 
+// The next piece, and what it is: a delimiter only when it begins a line.
+bool MultipartStream::NextClassified(std::string* piece, LineKind* kind) {
+  const bool at_line_start = line_start_;
+  if (!NextPiece(piece)) return false;
+  *kind = at_line_start ? Classify(*piece) : LineKind::kText;
+  return true;
+}
+
 MultipartStream::LineKind MultipartStream::Classify(std::string_view piece) {
   std::string_view line = TrimBlanks(piece);
   if (boundary_.empty()) {
@@ -237,14 +246,11 @@ MultipartStream::LineKind MultipartStream::Classify(std::string_view piece) {
 bool MultipartStream::SkipToBoundary(std::string* text) {
   size_t passed = 0;
   std::string piece;
+  LineKind kind;
   for (;;) {
-    const bool at_line_start = line_start_;
-    if (!NextPiece(&piece)) return false;
-    if (at_line_start) {
-      LineKind kind = Classify(piece);
-      if (kind == LineKind::kBoundary) return true;
-      if (kind == LineKind::kClose) return false;  // the camera ended the stream
-    }
+    if (!NextClassified(&piece, &kind)) return false;
+    if (kind == LineKind::kBoundary) return true;
+    if (kind == LineKind::kClose) return false;  // the camera ended the stream
     passed += piece.size();
     if (passed > kMaxScan) return false;
     if (text != nullptr) {
@@ -273,17 +279,14 @@ bool MultipartStream::ReadBodyToBoundary() {
   body_.clear();
   body_read_ = 0;
   std::string piece;
+  LineKind kind;
   for (;;) {
-    const bool at_line_start = line_start_;
-    if (!NextPiece(&piece)) return false;
-    if (at_line_start) {
-      LineKind kind = Classify(piece);
-      if (kind != LineKind::kText) {
-        DropLineEnd(&body_);
-        // After a closing delimiter the stream ends; the next header read finds that out.
-        at_header_ = kind == LineKind::kBoundary;
-        return true;
-      }
+    if (!NextClassified(&piece, &kind)) return false;
+    if (kind != LineKind::kText) {
+      DropLineEnd(&body_);
+      // After a closing delimiter the stream ends; the next header read finds that out.
+      at_header_ = kind == LineKind::kBoundary;
+      return true;
     }
     body_ += piece;
     if (body_.size() > static_cast<size_t>(MultipartFetch::kMaxPartLength)) return false;

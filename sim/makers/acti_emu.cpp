@@ -89,7 +89,7 @@ void HandleActi(HttpConnection& connection, CameraState& state, int tcp_port) {
     connection.Write(MakeResponse(200, "text/plain", KeyLine("DIO_STATUS", hex)));
     return;
   }
-  connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
+  AnswerNotFound(connection);
 }
 
 // The text of a zero-padded field, up to its first NUL.
@@ -173,16 +173,13 @@ void ServeControlPort(TcpConnection& connection, CameraState& state, const Login
 }  // namespace
 
 Emulation ActiEmulation() {
-  Emulation e;
-  e.key = "acti";
-  e.maker = "ACTi";
-  e.classes = {"ACTiMD", "ACTiEID"};
+  Emulation e = MakeEmulation("acti", "ACTi", nullptr,
+                             {
+                                 {"ACTiMD", "motion", nullptr},
+                                 {"ACTiEID", "inputs", {{"inputs", 2}}},
+                             });
   e.handle_with_tcp_port = HandleActi;
   e.tcp_service = ServeControlPort;
-  e.detectors = {
-      {"ACTiMD", "motion", nullptr},
-      {"ACTiEID", "inputs", {{"inputs", 2}}},
-  };
   return e;
 }
 

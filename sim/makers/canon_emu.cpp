@@ -26,27 +26,18 @@ std::string InfoBody(const CameraStatus& status) {
 }
 
 void HandleCanon(HttpConnection& connection, CameraState& state) {
-  const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kInfoPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
+  if (!ServesGetOf(connection, kInfoPath)) return;
   connection.Write(MakeResponse(200, "text/plain", InfoBody(state.Get())));
 }
 
 }  // namespace
 
 Emulation CanonEmulation() {
-  Emulation e;
-  e.key = "canon";
-  e.maker = "Canon";
-  e.classes = {"CanonMD", "CanonEID"};
-  e.handle = HandleCanon;
-  e.detectors = {
-      {"CanonMD", "motion", nullptr},
-      {"CanonEID", "inputs", {{"inputs", 1}}},
-  };
-  return e;
+  return MakeEmulation("canon", "Canon", HandleCanon,
+                       {
+                           {"CanonMD", "motion", nullptr},
+                           {"CanonEID", "inputs", {{"inputs", 1}}},
+                       });
 }
 
 }  // namespace evsim

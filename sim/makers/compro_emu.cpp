@@ -22,11 +22,8 @@ std::string MotionList(const CameraStatus& status) {
 }
 
 void HandleCompro(HttpConnection& connection, CameraState& state) {
+  if (!ServesGetOf(connection, kListPath)) return;
   const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kListPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
   if (request.target != std::string(kListPath) + "?" + kListQuery) {
     connection.Write(MakeResponse(400, "text/plain", "unknown group\r\n"));
     return;
@@ -37,15 +34,10 @@ void HandleCompro(HttpConnection& connection, CameraState& state) {
 }  // namespace
 
 Emulation ComproEmulation() {
-  Emulation e;
-  e.key = "compro";
-  e.maker = "COMPRO";
-  e.classes = {"COMPROMD"};
-  e.handle = HandleCompro;
-  e.detectors = {
-      {"COMPROMD", "motion", nullptr},
-  };
-  return e;
+  return MakeEmulation("compro", "COMPRO", HandleCompro,
+                       {
+                           {"COMPROMD", "motion", nullptr},
+                       });
 }
 
 }  // namespace evsim

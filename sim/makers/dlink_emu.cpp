@@ -30,27 +30,18 @@ std::string NotifyBody(const CameraStatus& status) {
 }
 
 void HandleDLink(HttpConnection& connection, CameraState& state) {
-  const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kNotifyPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
+  if (!ServesGetOf(connection, kNotifyPath)) return;
   connection.Write(MakeResponse(200, "text/plain", NotifyBody(state.Get())));
 }
 
 }  // namespace
 
 Emulation DLinkEmulation() {
-  Emulation e;
-  e.key = "dlink";
-  e.maker = "D-Link";
-  e.classes = {"DLinkMD", "DLINKEID"};
-  e.handle = HandleDLink;
-  e.detectors = {
-      {"DLinkMD", "motion", nullptr},
-      {"DLINKEID", "inputs", {{"inputs", kDLinkInputs}}},
-  };
-  return e;
+  return MakeEmulation("dlink", "D-Link", HandleDLink,
+                       {
+                           {"DLinkMD", "motion", nullptr},
+                           {"DLINKEID", "inputs", {{"inputs", kDLinkInputs}}},
+                       });
 }
 
 }  // namespace evsim

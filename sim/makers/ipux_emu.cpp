@@ -30,11 +30,8 @@ std::string StatusRecord(const CameraStatus& status) {
 }
 
 void HandleIpux(HttpConnection& connection, CameraState& state) {
+  if (!ServesGetOf(connection, kStreamPath)) return;
   const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kStreamPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
   ServeMultipart(connection, "application/octet-stream", FramePeriod(request, kFps),
                  [&state]() -> std::string {
                    const CameraStatus status = state.Get();
@@ -45,24 +42,17 @@ void HandleIpux(HttpConnection& connection, CameraState& state) {
 }  // namespace
 
 Emulation IpuxEmulation() {
-  Emulation e;
-  e.key = "ipux";
-  e.maker = "IPux";
-  e.classes = {"IPuxMD", "IPuxEID"};
-  e.handle = HandleIpux;
-  e.detectors = {
-      {"IPuxMD", "motion", nullptr},
-      {"IPuxEID", "input", {{"inputs", 1}}},
-      {"IPuxMD", "motion-buffered", {{"stream_buffer", true}}},
-  };
+  Emulation e = MakeEmulation("ipux", "IPux", HandleIpux,
+                             {
+                                 {"IPuxMD", "motion", nullptr},
+                                 {"IPuxEID", "input", {{"inputs", 1}}},
+                                 {"IPuxMD", "motion-buffered", {{"stream_buffer", true}}},
+                             });
   e.api = [](int port) {
     return nlohmann::json{{"stream", {{"path", kStreamPath}, {"port", port}}},
                           {"md_params", {0, kThreshold, 0, 0}}};
   };
-  e.frames = [](int port) {
-    return nlohmann::json{
-        {"path", std::string(kStreamPath) + "?fps=" + std::to_string(kBufferFps)}, {"port", port}};
-  };
+  e.frames = FramesAt(std::string(kStreamPath) + "?fps=" + std::to_string(kBufferFps));
   return e;
 }
 

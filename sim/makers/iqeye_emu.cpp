@@ -21,21 +21,16 @@ void HandleIqeye(HttpConnection& connection, CameraState& state) {
   MotionDataStyle style;
   style.line = WindowLine;
   if (ServeMotionDataAt(connection, state, kMotionDataPath, style)) return;
-  connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
+  AnswerNotFound(connection);
 }
 
 }  // namespace
 
 Emulation IqeyeEmulation() {
-  Emulation e;
-  e.key = "iqeye";
-  e.maker = "IQeye";
-  e.classes = {"IQeyeV2MD"};
-  e.handle = HandleIqeye;
-  e.detectors = {
-      {"IQeyeV2MD", "motion", nullptr},
-  };
-  return e;
+  return MakeEmulation("iqeye", "IQeye", HandleIqeye,
+                       {
+                           {"IQeyeV2MD", "motion", nullptr},
+                       });
 }
 
 }  // namespace evsim

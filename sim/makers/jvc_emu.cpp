@@ -25,11 +25,8 @@ std::string ComSegment(const CameraStatus& status) {
 }
 
 void HandleJvc(HttpConnection& connection, CameraState& state) {
+  if (!ServesGetOf(connection, kStreamPath)) return;
   const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kStreamPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
   ServeEventFrames(connection, state, FramePeriod(request, kFps), [](const CameraStatus& status) {
     return std::vector<JpegSegment>{{kJpegCom, ComSegment(status)}};
   });
@@ -38,23 +35,13 @@ void HandleJvc(HttpConnection& connection, CameraState& state) {
 }  // namespace
 
 Emulation JvcEmulation() {
-  Emulation e;
-  e.key = "jvc";
-  e.maker = "JVC";
-  e.classes = {"JVCJpgMD"};
-  e.handle = HandleJvc;
-  e.detectors = {
-      {"JVCJpgMD", "motion", {{"stream_buffer", true}}},
-      {"JVCJpgMD", "motion-stream", nullptr},
-  };
-  e.api = [](int port) {
-    return nlohmann::json{{"stream", {{"path", std::string(kStreamPath) + "?encode=jpeg"}, {"port", port}}}};
-  };
-  e.frames = [](int port) {
-    return nlohmann::json{
-        {"path", std::string(kStreamPath) + "?encode=jpeg&fps=" + std::to_string(kBufferFps)},
-        {"port", port}};
-  };
+  Emulation e = MakeEmulation("jvc", "JVC", HandleJvc,
+                             {
+                                 {"JVCJpgMD", "motion", {{"stream_buffer", true}}},
+                                 {"JVCJpgMD", "motion-stream", nullptr},
+                             });
+  e.api = StreamApi(std::string(kStreamPath) + "?encode=jpeg");
+  e.frames = FramesAt(std::string(kStreamPath) + "?encode=jpeg&fps=" + std::to_string(kBufferFps));
   return e;
 }
 

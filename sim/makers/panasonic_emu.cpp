@@ -34,11 +34,8 @@ std::string ComSegment(const CameraStatus& status, bool group1) {
 }
 
 void HandlePanasonic(HttpConnection& connection, CameraState& state) {
+  if (!ServesGetOf(connection, kStreamPath)) return;
   const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kStreamPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
   const bool group1 = request.target.find("group=1") != std::string::npos;
   ServeEventFrames(connection, state, FramePeriod(request, kFps),
                    [group1](const CameraStatus& status) {
@@ -49,18 +46,12 @@ void HandlePanasonic(HttpConnection& connection, CameraState& state) {
 }  // namespace
 
 Emulation PanasonicEmulation() {
-  Emulation e;
-  e.key = "panasonic";
-  e.maker = "Panasonic";
-  e.classes = {"PanaJpgED"};
-  e.handle = HandlePanasonic;
-  e.detectors = {
-      {"PanaJpgED", "motion", {{"type", 0}}},
-      {"PanaJpgED", "input", {{"type", 1}, {"function_group", 0}}},
-  };
-  e.api = [](int port) {
-    return nlohmann::json{{"stream", {{"path", std::string(kStreamPath) + kStreamQuery}, {"port", port}}}};
-  };
+  Emulation e = MakeEmulation("panasonic", "Panasonic", HandlePanasonic,
+                             {
+                                 {"PanaJpgED", "motion", {{"type", 0}}},
+                                 {"PanaJpgED", "input", {{"type", 1}, {"function_group", 0}}},
+                             });
+  e.api = StreamApi(std::string(kStreamPath) + kStreamQuery);
   return e;
 }
 

@@ -32,11 +32,7 @@ std::string StatusRecord(const CameraStatus& status) {
 }
 
 void HandleSanyo(HttpConnection& connection, CameraState& state) {
-  const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kStatusPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
+  if (!ServesGetOf(connection, kStatusPath)) return;
   connection.Write(MakeResponse(200, "application/octet-stream", StatusRecord(state.Get())));
 }
 
@@ -48,15 +44,11 @@ nlohmann::json SanyoApi(int port) {
 }  // namespace
 
 Emulation SanyoEmulation() {
-  Emulation e;
-  e.key = "sanyo";
-  e.maker = "Sanyo";
-  e.classes = {"SanyoMD", "SanyoEID"};
-  e.handle = HandleSanyo;
-  e.detectors = {
-      {"SanyoMD", "motion", nullptr},
-      {"SanyoEID", "inputs", {{"inputs", kSanyoInputs}}},
-  };
+  Emulation e = MakeEmulation("sanyo", "Sanyo", HandleSanyo,
+                             {
+                                 {"SanyoMD", "motion", nullptr},
+                                 {"SanyoEID", "inputs", {{"inputs", kSanyoInputs}}},
+                             });
   e.api = SanyoApi;
   return e;
 }

@@ -26,11 +26,8 @@ constexpr int kLightPeriod = 5 * kFps;  // frames between changes of the light
 constexpr double kLightGain = 1.3;
 
 void HandleScene(HttpConnection& connection, CameraState& state) {
+  if (!ServesGetOf(connection, kStreamPath)) return;
   const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kStreamPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
   SceneOptions options;
   options.width = kWidth;
   options.height = kHeight;
@@ -56,19 +53,12 @@ void HandleScene(HttpConnection& connection, CameraState& state) {
 }  // namespace
 
 Emulation SceneEmulation() {
-  Emulation e;
-  e.key = "scene";
-  e.maker = "Any";
-  e.classes = {"JpegDiffMD"};
-  e.handle = HandleScene;
-  e.detectors = {
-      {"JpegDiffMD", "motion", {{"stream_buffer", true}}},
-      {"JpegDiffMD", "motion-shm", nullptr},
-  };
-  e.frames = [](int port) {
-    return nlohmann::json{{"path", std::string(kStreamPath) + "?fps=" + std::to_string(kFps)},
-                          {"port", port}};
-  };
+  Emulation e = MakeEmulation("scene", "Any", HandleScene,
+                             {
+                                 {"JpegDiffMD", "motion", {{"stream_buffer", true}}},
+                                 {"JpegDiffMD", "motion-shm", nullptr},
+                             });
+  e.frames = FramesAt(std::string(kStreamPath) + "?fps=" + std::to_string(kFps));
   return e;
 }
 

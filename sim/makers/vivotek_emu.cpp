@@ -44,11 +44,8 @@ std::string App2Record(const CameraStatus& status) {
 }
 
 void HandleVivotek(HttpConnection& connection, CameraState& state) {
+  if (!ServesGetOf(connection, kStreamPath)) return;
   const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kStreamPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
   ServeEventFrames(connection, state, FramePeriod(request, kFps), [](const CameraStatus& status) {
     return std::vector<JpegSegment>{{kJpegApp0, App0Record(status)},
                                     {kJpegApp2, App2Record(status)}};
@@ -58,23 +55,14 @@ void HandleVivotek(HttpConnection& connection, CameraState& state) {
 }  // namespace
 
 Emulation VivotekEmulation() {
-  Emulation e;
-  e.key = "vivotek";
-  e.maker = "Vivotek";
-  e.classes = {"VivotekJpgMD"};
-  e.handle = HandleVivotek;
   // One reader of the camera's own stream (APP0) and one of the frame buffer (APP2).
-  e.detectors = {
-      {"VivotekJpgMD", "motion", {{"function_group", 0}}},
-      {"VivotekJpgMD", "motion-app2", {{"function_group", 1}, {"stream_buffer", true}}},
-  };
-  e.api = [](int port) {
-    return nlohmann::json{{"stream", {{"path", kStreamPath}, {"port", port}}}};
-  };
-  e.frames = [](int port) {
-    return nlohmann::json{
-        {"path", std::string(kStreamPath) + "?fps=" + std::to_string(kBufferFps)}, {"port", port}};
-  };
+  Emulation e = MakeEmulation("vivotek", "Vivotek", HandleVivotek,
+                             {
+                                 {"VivotekJpgMD", "motion", {{"function_group", 0}}},
+                                 {"VivotekJpgMD", "motion-app2", {{"function_group", 1}, {"stream_buffer", true}}},
+                             });
+  e.api = StreamApi(kStreamPath);
+  e.frames = FramesAt(std::string(kStreamPath) + "?fps=" + std::to_string(kBufferFps));
   return e;
 }
 

@@ -26,26 +26,17 @@ std::string ArmRecord(const CameraStatus& status) {
 }
 
 void HandleYcam(HttpConnection& connection, CameraState& state) {
-  const HttpRequest& request = connection.Request();
-  if (request.method != "GET" || request.Path() != kArmPath) {
-    connection.Write(MakeResponse(404, "text/plain", "not found\r\n"));
-    return;
-  }
+  if (!ServesGetOf(connection, kArmPath)) return;
   connection.Write(MakeResponse(200, "application/octet-stream", ArmRecord(state.Get())));
 }
 
 }  // namespace
 
 Emulation YcamEmulation() {
-  Emulation e;
-  e.key = "ycam";
-  e.maker = "Y-cam";
-  e.classes = {"YCAMMD"};
-  e.handle = HandleYcam;
-  e.detectors = {
-      {"YCAMMD", "motion", nullptr},
-  };
-  return e;
+  return MakeEmulation("ycam", "Y-cam", HandleYcam,
+                       {
+                           {"YCAMMD", "motion", nullptr},
+                       });
 }
 
 }  // namespace evsim
