@@ -1,8 +1,9 @@
 // The table of camera emulations: for each camera maker, how its cameras answer (a request
 // handler that reads a CameraState) and which evwatch detector entries watch such a camera.
 //
-// Adding a maker: write its emulation in its own file (sim/<maker>_emu.cpp) as a function
-// returning an Emulation, and add that function to the table in emulation.cpp.
+// Adding a maker: write its emulation in its own file (sim/makers/<maker>_emu.cpp; makers
+// that share an interface share one) as a function returning an Emulation, and add that
+// function to the table in emulation.cpp.
 //
 // Threads: the table is built once and read-only after that. A handler runs on a server
 // connection thread, several at once for one camera.
