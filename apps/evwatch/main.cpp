@@ -31,6 +31,10 @@ std::optional<evwatch::Config> Load(const std::string& file) {
   std::string error;
   std::optional<evwatch::Config> config = evwatch::LoadConfig(file, &error);
   if (!config) std::cerr << "evwatch: " << error << std::endl;
+  if (config) {
+    for (const std::string& warning : config->warnings) std::cerr << "evwatch: " << warning << "\n";
+    std::cerr << std::flush;
+  }
   return config;
 }
 
