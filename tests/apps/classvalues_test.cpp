@@ -6,7 +6,6 @@
 
 #include <gtest/gtest.h>
 
-#include <fstream>
 #include <nlohmann/json.hpp>
 
 #include "tests/apps/apptestutil.h"
@@ -15,17 +14,6 @@ namespace evtest {
 namespace {
 
 using std::chrono::seconds;
-
-// The configuration camsim wrote, with `change` applied to every detector entry.
-std::string Rewrite(const std::string& path, const TempDir& dir,
-                    const std::function<void(nlohmann::json&)>& change) {
-  std::ifstream in(path);
-  nlohmann::json config = nlohmann::json::parse(in);
-  for (auto& camera : config["cameras"]) {
-    for (auto& detector : camera["detectors"]) change(detector);
-  }
-  return dir.Write("unusual.json", config.dump(2));
-}
 
 size_t CountSince(const std::vector<ReportLine>& reports, size_t from, bool state) {
   size_t n = 0;
@@ -37,11 +25,12 @@ TEST(ClassValuesTest, UnusualConstructorValuesRunAsTheClassesDefine) {
   TempDir dir;
   Camsim sim(dir, {"-e", "zavio", "-e", "acti", "-e", "vivotek", "-e", "panasonic"});
   ASSERT_TRUE(sim.Ready());
-  const std::string config = Rewrite(sim.ConfigPath(), dir, [](nlohmann::json& d) {
+  const std::string config = sim.Rewrite(dir, "unusual.json", [](nlohmann::json& d) {
     const std::string cls = d["class"];
     if (cls == "ZavioEID" || cls == "ACTiEID") d["inputs"] = -1;
     if (cls == "VivotekJpgMD" && d["name"] == "motion") d["function_group"] = 5;
     if (cls == "PanaJpgED" && d["name"] == "input") d["function_group"] = 2;
+    return true;
   });
 
   ChildProcess evwatch({EvwatchPath(), "run", "--every", "-c", config});
