@@ -8,6 +8,9 @@
 #   make bench      build and run the benchmarks (installs OpenCV for the motion benchmark)
 #   make lib        build only libeventdetector and libevhost (build-lib/)
 
+# Sub-makes (CMake's build) say nothing of the directories they enter.
+MAKEFLAGS += --no-print-directory
+
 SANITIZE ?=
 JOBS ?= $(shell nproc 2>/dev/null || echo 2)
 
@@ -39,7 +42,9 @@ test: build
 	@cd $(BUILD) && ctest --output-on-failure -j $(JOBS) --timeout 300
 
 demo: configure
-	@cmake --build $(BUILD) -j $(JOBS) --target evwatch
+	@echo "make demo: building evwatch and camsim (the first time takes a few minutes) ..."
+	@cmake --build $(BUILD) -j $(JOBS) --target evwatch > $(BUILD)/demo-build.log 2>&1 || \
+	  { cat $(BUILD)/demo-build.log; exit 1; }
 	@$(BUILD)/bin/evwatch demo $(if $(DURATION),--duration $(DURATION))
 
 bench: build

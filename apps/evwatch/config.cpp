@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <charconv>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <set>
 #include <sstream>
@@ -335,6 +336,11 @@ std::optional<Config> ParseConfig(const std::string& text, const std::string& fi
 }
 
 std::optional<Config> LoadConfig(const std::string& file, std::string* error) {
+  std::error_code code;
+  if (std::filesystem::is_directory(file, code)) {
+    *error = file + ": is a directory, not a configuration file";
+    return std::nullopt;
+  }
   std::ifstream in(file, std::ios::binary);
   if (!in) {
     *error = file + ": cannot read: " + std::strerror(errno);

@@ -10,6 +10,7 @@
 #include <climits>
 #include <cstdlib>
 #include <fstream>
+#include <map>
 #include <nlohmann/json.hpp>
 #include <set>
 #include <sstream>
@@ -179,6 +180,18 @@ std::string KeepRegistered(const std::string& text, std::set<std::string>* kept)
   return config.dump(2);
 }
 
+// "demo: 412 events from 18 cameras (axis1 20, canon1 12, ...)".
+std::string DemoSummary(const std::map<std::string, size_t>& lines) {
+  size_t total = 0;
+  std::string each;
+  for (const auto& [camera, n] : lines) {
+    total += n;
+    each += (each.empty() ? "" : ", ") + camera + " " + std::to_string(n);
+  }
+  return "demo: " + std::to_string(total) + " events from " + std::to_string(lines.size()) + " cameras (" +
+         each + ")";
+}
+
 }  // namespace
 
 int RunDemo(std::optional<double> seconds, std::ostream& out, std::ostream& err) {
@@ -223,6 +236,7 @@ int RunDemo(std::optional<double> seconds, std::ostream& out, std::ostream& err)
   // ends with it.
   RunUnlessSignalled([&runner] { runner.Stop(); }, [&out](int) { out << std::flush; });
   simulator.Stop();
+  out << DemoSummary(sink.LinesPerCamera()) << std::endl;
   return 0;
 }
 

@@ -9,7 +9,10 @@
 // at run time.
 
 #include <CLI/CLI.hpp>
-#include <iomanip>
+#include <algorithm>
+#include <cmath>
+#include <cstdlib>
+#include <nlohmann/json.hpp>
 #include <iostream>
 #include <optional>
 #include <string>
@@ -92,25 +95,72 @@ std::string FieldNames(const evwatch::DetectorClass& c) {
   return out.empty() ? "-" : out;
 }
 
-int Classes() {
-  const auto& classes = evwatch::DetectorClasses();
-  size_t w[5] = {5, 5, 4, 11, 6};
-  for (const auto& c : classes) {
-    w[0] = std::max(w[0], c.name.size());
-    w[1] = std::max(w[1], c.maker.size());
-    w[2] = std::max(w[2], std::string(evwatch::KindName(c.kind)).size());
-    w[3] = std::max(w[3], c.constructor.size());
-    w[4] = std::max(w[4], FieldNames(c).size());
+// text as lines of at most `columns` characters, each beginning with `indent`, broken at
+// blanks (a word longer than a line is not broken).
+std::string Wrapped(const std::string& text, const std::string& indent, size_t columns) {
+  std::string out, line = indent;
+  size_t at = 0;
+  while (at < text.size()) {
+    size_t end = text.find(' ', at);
+    if (end == std::string::npos) end = text.size();
+    const std::string word = text.substr(at, end - at);
+    if (line.size() > indent.size() && line.size() + 1 + word.size() > columns) {
+      out += line + '\n';
+      line = indent;
+    }
+    line += (line.size() > indent.size() ? " " : "") + word;
+    at = end + 1;
   }
-  auto row = [&](const std::string& a, const std::string& b, const std::string& c, const std::string& d,
-                 const std::string& e, const std::string& f) {
-    std::cout << std::left << std::setw(w[0] + 2) << a << std::setw(w[1] + 2) << b << std::setw(w[2] + 2) << c
-              << std::setw(w[3] + 2) << d << std::setw(w[4] + 2) << e << f << '\n';
-  };
-  row("CLASS", "MAKER", "KIND", "CONSTRUCTOR", "FIELDS", "HOW THE CAMERA IS ASKED");
-  for (const auto& c : classes) row(c.name, c.maker, evwatch::KindName(c.kind), c.constructor, FieldNames(c), c.how);
+  return out + line + '\n';
+}
+
+// `evwatch classes`: a table that fits 100 columns (the constructor and the whole of how the
+// camera is asked with --wide), or JSON for programs.
+int Classes(bool wide, const std::string& format) {
+  const auto& classes = evwatch::DetectorClasses();
+  if (format == "json") {
+    nlohmann::ordered_json list = nlohmann::ordered_json::array();
+    for (const auto& c : classes) {
+      list.push_back({{"class", c.name}, {"maker", c.maker}, {"kind", evwatch::KindName(c.kind)},
+                      {"constructor", c.constructor}, {"fields", FieldNames(c)}, {"how", c.how}});
+    }
+    std::cout << list.dump(2) << std::endl;
+    return kExitOk;
+  }
+  std::vector<std::vector<std::string>> rows = {{"CLASS", "MAKER", "KIND", "FIELDS", "HOW THE CAMERA IS ASKED"}};
+  if (wide) rows[0].insert(rows[0].begin() + 3, "CONSTRUCTOR");
+  for (const auto& c : classes) {
+    rows.push_back({c.name, c.maker, evwatch::KindName(c.kind), FieldNames(c), c.how});
+    if (wide) rows.back().insert(rows.back().begin() + 3, c.constructor);
+  }
+  std::vector<size_t> width(rows[0].size(), 0);
+  for (const auto& r : rows) {
+    for (size_t i = 0; i + 1 < r.size(); ++i) width[i] = std::max(width[i], r[i].size());
+  }
+  for (const auto& r : rows) {
+    std::string line;
+    for (size_t i = 0; i + 1 < r.size(); ++i) line += r[i] + std::string(width[i] + 2 - r[i].size(), ' ');
+    if (wide) {
+      std::cout << line << r.back() << '\n';
+      continue;
+    }
+    // Narrow: how the camera is asked goes on indented lines below its class.
+    line.erase(line.find_last_not_of(' ') + 1);
+    std::cout << line << '\n';
+    if (&r != &rows[0]) std::cout << Wrapped(r.back(), "    ", 100);
+  }
   std::cout << std::flush;
   return kExitOk;
+}
+
+// --duration: a number of seconds above 0 that a clock can count to.
+std::string CheckSeconds(std::string& text) {
+  char* end = nullptr;
+  const double seconds = std::strtod(text.c_str(), &end);
+  if (end == text.c_str() || *end != '\0' || !std::isfinite(seconds) || seconds <= 0 || seconds > 1e9) {
+    return "must be a number of seconds above 0 and at most 1e9, not " + text;
+  }
+  return "";
 }
 
 }  // namespace
@@ -120,6 +170,8 @@ int main(int argc, char** argv) {
 
   CLI::App app{"evwatch: camera event detectors, run from a configuration file"};
   app.require_subcommand(1);
+  app.set_version_flag("--version", "evwatch " EVWATCH_VERSION);
+  const CLI::Validator seconds_check(CheckSeconds, "SECONDS");
 
   std::string file, format = "jsonl";
   bool every = false;
@@ -128,14 +180,18 @@ int main(int argc, char** argv) {
   CLI::App* run = app.add_subcommand("run", "run the detectors of a configuration and print their readings");
   run->add_option("-c,--config", file, "configuration file (YAML or JSON)")->required();
   run->add_flag("--every", every, "print every reading, not only changes");
-  run->add_option("--duration", run_seconds, "stop after this many seconds")->check(CLI::PositiveNumber);
+  run->add_option("--duration", run_seconds, "stop after this many seconds")->check(seconds_check);
   run->add_option("--format", format, "output format: jsonl (default) or text")
       ->check(CLI::IsMember({"jsonl", "text"}));
 
   CLI::App* demo = app.add_subcommand("demo", "run every detector class against the built-in simulator");
-  demo->add_option("--duration", demo_seconds, "stop after this many seconds")->check(CLI::PositiveNumber);
+  demo->add_option("--duration", demo_seconds, "stop after this many seconds")->check(seconds_check);
 
   CLI::App* classes = app.add_subcommand("classes", "list the detector classes");
+  bool wide = false;
+  std::string classes_format = "text";
+  classes->add_flag("--wide", wide, "show the constructors and the whole of each description");
+  classes->add_option("--format", classes_format, "text (default) or json")->check(CLI::IsMember({"text", "json"}));
 
   CLI::App* check = app.add_subcommand("check", "check a configuration file");
   check->add_option("-c,--config", file, "configuration file (YAML or JSON)")->required();
@@ -153,15 +209,20 @@ int main(int argc, char** argv) {
     return app.exit(e);
   } catch (const CLI::CallForAllHelp& e) {
     return app.exit(e);
+  } catch (const CLI::CallForVersion& e) {
+    return app.exit(e);
   } catch (const CLI::ParseError& e) {
-    std::cerr << "evwatch: " << e.what() << " (see evwatch --help)" << std::endl;
+    // Point at the help of the command the words were for.
+    const bool command = first[0] != '-';
+    std::cerr << "evwatch: " << e.what() << " (see evwatch " << (command ? first + " " : "") << "--help)"
+              << std::endl;
     return kExitUsage;
   }
 
   try {
     if (*run) return Run(file, every, run_seconds, format);
     if (*demo) return evwatch::RunDemo(demo_seconds, std::cout, std::cerr);
-    if (*classes) return Classes();
+    if (*classes) return Classes(wide, classes_format);
     if (*check) return Check(file);
   } catch (const std::exception& e) {
     std::cerr << "evwatch: " << e.what() << std::endl;

@@ -79,6 +79,14 @@ void Sink::Report(int handle, const StatusReport& report) {
   if (!changed && !every_) return;
   out_ << Line(e, report) << '\n' << std::flush;
   if (!out_) failed_ = true;
+  ++e.lines;
+}
+
+std::map<std::string, size_t> Sink::LinesPerCamera() const {
+  std::lock_guard<std::mutex> lock(mutex_);
+  std::map<std::string, size_t> lines;
+  for (const Entry& e : entries_) lines[e.camera] += e.lines;
+  return lines;
 }
 
 }  // namespace evwatch

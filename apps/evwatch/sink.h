@@ -10,6 +10,7 @@
 #define EVWATCH_APPS_EVWATCH_SINK_H_
 
 #include <atomic>
+#include <map>
 #include <mutex>
 #include <ostream>
 #include <string>
@@ -36,6 +37,8 @@ class Sink {
 
   // Whether a write has failed (the output was closed).
   bool Failed() const { return failed_.load(); }
+  // How many lines each camera's detectors have printed, by camera name.
+  std::map<std::string, size_t> LinesPerCamera() const;
 
  private:
   struct Entry {
@@ -44,6 +47,7 @@ class Sink {
     std::string cls;
     DetectorKind kind;
     bool reported = false;  // whether state/value hold a previous report
+    size_t lines = 0;       // printed so far
     bool state = false;
     int value = 0;
   };

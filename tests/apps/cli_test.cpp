@@ -43,8 +43,31 @@ INSTANTIATE_TEST_SUITE_P(
                       Usage{"NegativeDuration", {"run", "-c", "x.yaml", "--duration", "-1"}, "duration"},
                       Usage{"WordForDuration", {"demo", "--duration", "soon"}, "duration"},
                       Usage{"UnknownOption", {"run", "-c", "x.yaml", "--all"}, "--all"},
-                      Usage{"ClassesTakesNoArguments", {"classes", "extra"}, "extra"}),
+                      Usage{"ClassesTakesNoArguments", {"classes", "extra"}, "extra"},
+                      Usage{"NanDuration", {"run", "-c", "x.yaml", "--duration", "nan"},
+                            "--duration: must be a number of seconds above 0 and at most 1e9, not nan"},
+                      Usage{"InfiniteDuration", {"run", "-c", "x.yaml", "--duration", "inf"}, "not inf"},
+                      Usage{"ZeroDuration", {"demo", "--duration", "0"}, "not 0 (see evwatch demo --help)"},
+                      Usage{"HugeDuration", {"run", "-c", "x.yaml", "--duration", "1e300"}, "not 1e300"},
+                      Usage{"SubcommandErrorPointsAtItsHelp", {"run", "-c", "x.yaml", "--all"},
+                            "(see evwatch run --help)"}),
     [](const ::testing::TestParamInfo<Usage>& info) { return std::string(info.param.label); });
+
+TEST(CliTest, VersionIsOneLine) {
+  Completed done = RunToEnd({EvwatchPath(), "--version"});
+  EXPECT_EQ(done.status, 0);
+  ASSERT_EQ(done.out.size(), 1u);
+  EXPECT_EQ(done.out[0].rfind("evwatch ", 0), 0u) << done.out[0];
+  EXPECT_NE(done.out[0].find_first_of("0123456789"), std::string::npos) << done.out[0];
+}
+
+TEST(CliTest, DirectoryAsConfigurationSaysSo) {
+  TempDir dir;
+  Completed done = RunToEnd({EvwatchPath(), "check", "-c", dir.Path()});
+  EXPECT_EQ(done.status, 2);
+  ASSERT_EQ(done.err.size(), 1u);
+  EXPECT_EQ(done.err[0], "evwatch: " + dir.Path() + ": is a directory, not a configuration file");
+}
 
 TEST(CliTest, HelpExitsZero) {
   Completed done = RunToEnd({EvwatchPath(), "--help"});
@@ -69,6 +92,10 @@ TEST(CliTest, DemoShowsEventsAndEndsByItself) {
     motion = motion || t->words == "MOTION";
     active = active || t->words == "ACTIVE";
   }
+  // It ends with one line that counts the events of each camera.
+  ASSERT_FALSE(done.out.empty());
+  EXPECT_EQ(done.out.back().rfind("demo: ", 0), 0u) << done.out.back();
+  EXPECT_NE(done.out.back().find(" events from "), std::string::npos) << done.out.back();
   EXPECT_TRUE(motion) << "no motion event within the demo's ten seconds";
   EXPECT_TRUE(active) << "no input event within the demo's ten seconds";
   ASSERT_FALSE(last.empty());

@@ -5,6 +5,8 @@
 
 #include <gtest/gtest.h>
 
+#include <nlohmann/json.hpp>
+
 #include <set>
 
 #include "framework/host/camera.h"
@@ -92,12 +94,35 @@ TEST(RegistryTest, EveryClassHasAnEmulationAndEveryEmulatedClassIsRegistered) {
   }
 }
 
-TEST(RegistryTest, ClassesCommandListsEveryRow) {
+TEST(RegistryTest, ClassesCommandListsEveryRowWithin100Columns) {
   evtest::Completed done = evtest::RunToEnd({evtest::EvwatchPath(), "classes"});
   ASSERT_EQ(done.status, 0);
   EXPECT_TRUE(done.err.empty());
+  // One line per class and the heading; how the camera is asked on indented lines below.
+  std::vector<std::string> rows;
+  std::string how;  // all the indented text, joined
+  for (const std::string& line : done.out) {
+    EXPECT_LE(line.size(), 100u) << line;
+    if (line.rfind("    ", 0) == 0) {
+      how += line.substr(4) + " ";
+    } else {
+      rows.push_back(line);
+    }
+  }
+  ASSERT_EQ(rows.size(), DetectorClasses().size() + 1);
+  EXPECT_EQ(rows[0].rfind("CLASS", 0), 0u);
+  for (size_t i = 0; i < DetectorClasses().size(); ++i) {
+    const DetectorClass& c = DetectorClasses()[i];
+    EXPECT_EQ(rows[i + 1].rfind(c.name + " ", 0), 0u) << rows[i + 1];
+    EXPECT_NE(rows[i + 1].find(c.maker), std::string::npos) << rows[i + 1];
+    EXPECT_NE(how.find(c.how), std::string::npos) << c.how;
+  }
+}
+
+TEST(RegistryTest, WideClassesShowTheConstructorsOnOneLineEach) {
+  evtest::Completed done = evtest::RunToEnd({evtest::EvwatchPath(), "classes", "--wide"});
+  ASSERT_EQ(done.status, 0);
   ASSERT_EQ(done.out.size(), DetectorClasses().size() + 1);
-  EXPECT_EQ(done.out[0].rfind("CLASS", 0), 0u);
   for (size_t i = 0; i < DetectorClasses().size(); ++i) {
     const DetectorClass& c = DetectorClasses()[i];
     const std::string& line = done.out[i + 1];
@@ -105,6 +130,23 @@ TEST(RegistryTest, ClassesCommandListsEveryRow) {
     for (const std::string& part : {c.maker, std::string(KindName(c.kind)), c.constructor, c.how}) {
       EXPECT_NE(line.find(part), std::string::npos) << part << " missing from: " << line;
     }
+  }
+}
+
+TEST(RegistryTest, ClassesAsJsonForPrograms) {
+  evtest::Completed done = evtest::RunToEnd({evtest::EvwatchPath(), "classes", "--format", "json"});
+  ASSERT_EQ(done.status, 0);
+  std::string text;
+  for (const std::string& line : done.out) text += line + "\n";
+  nlohmann::json list = nlohmann::json::parse(text, nullptr, false);
+  ASSERT_TRUE(list.is_array()) << text;
+  ASSERT_EQ(list.size(), DetectorClasses().size());
+  for (size_t i = 0; i < list.size(); ++i) {
+    const DetectorClass& c = DetectorClasses()[i];
+    EXPECT_EQ(list[i]["class"], c.name);
+    EXPECT_EQ(list[i]["maker"], c.maker);
+    EXPECT_EQ(list[i]["constructor"], c.constructor);
+    EXPECT_EQ(list[i]["how"], c.how);
   }
 }
 
