@@ -17,6 +17,7 @@
 #include "detectors/media/jpghdrdetector.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
+#include "detectors/vivotek.h"
 #include "detectors/ycam.h"
 #include "detectors/zavio.h"
 #include "framework/host/camera.h"
@@ -174,6 +175,11 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),
+      Row<VivotekEID, Cam, VivoGroup, Inputs>(
+          "VivotekEID", "Vivotek", K::kInput,
+          "GET /cgi-bin/getdi.cgi?diN for N = 1..inputs (function group 0, 1; line DIN=H) or "
+          "/cgi-bin/dido/getdi.cgi?diN for N = 0..inputs-1 (2, 3; line diN=1) once per interval, "
+          "up to the first active input; other groups fail"),
       Row<VivotekJpgMD, Cam, Buf, Api, VivoGroup>(
           "VivotekJpgMD", "Vivotek", K::kMotion,
           "JPEG frames of the API's stream (1, 2) or the frame buffer; motion flag and level in "

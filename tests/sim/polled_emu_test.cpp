@@ -1,0 +1,59 @@
+// The emulations of the cameras whose detectors ask one CGI per pass (Vivotek and JVC
+// inputs, Messoa, LevelOne), read by those detectors themselves and by raw requests.
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "detectors/vivotek.h"
+#include "framework/host/camera.h"
+#include "sim/simulator.h"
+#include "tests/support/loopbackclient.h"
+
+namespace evsim {
+namespace {
+
+class PolledEmulationTest : public ::testing::Test {
+ protected:
+  void Start(const std::string& key, SimOptions options = {}) {
+    options.emulations = {key};
+    std::string error;
+    ASSERT_TRUE(sim_.Start(options, &error)) << error;
+    cam_ = &sim_.Cameras().at(0);
+  }
+  Camera MakeCamera(const SimCamera& cam) {
+    CameraRecord r;
+    r.host = "127.0.0.1";
+    r.port = cam.port;
+    return Camera(r);
+  }
+  Simulator sim_;
+  const SimCamera* cam_ = nullptr;
+};
+
+TEST_F(PolledEmulationTest, VivotekInputCgisOfBothFamilies) {
+  Start("vivotek");
+  cam_->state->SetInput(2, true);
+  std::string raw = evtest::Exchange(cam_->port, evtest::GetRequest("/cgi-bin/getdi.cgi?di2"));
+  EXPECT_NE(raw.find("\r\n\r\nDI2=H\r\n"), std::string::npos) << raw;
+  raw = evtest::Exchange(cam_->port, evtest::GetRequest("/cgi-bin/dido/getdi.cgi?di0"));
+  EXPECT_NE(raw.find("\r\n\r\ndi0=0\r\n"), std::string::npos) << raw;
+  raw = evtest::Exchange(cam_->port, evtest::GetRequest("/cgi-bin/getdi.cgi?di9"));
+  EXPECT_EQ(raw.rfind("HTTP/1.1 400", 0), 0u) << raw;
+
+  Camera camera = MakeCamera(*cam_);
+  for (int group : {0, 1, 2, 3}) {
+    VivotekEID eid(&camera, static_cast<VIVO_FUNC_GR>(group), 2);
+    bool active = false;
+    ASSERT_EQ(eid.DoEID(active), 0) << group;
+    EXPECT_TRUE(active) << group;
+  }
+  cam_->state->SetAllInputs(false);
+  VivotekEID eid(&camera, static_cast<VIVO_FUNC_GR>(2), 2);
+  bool active = true;
+  ASSERT_EQ(eid.DoEID(active), 0);
+  EXPECT_FALSE(active);
+}
+
+}  // namespace
+}  // namespace evsim
