@@ -13,6 +13,7 @@
 #include "detectors/hikvision.h"
 #include "detectors/ipux.h"
 #include "detectors/iqeye.h"
+#include "detectors/jvc.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
 #include "detectors/psia.h"
@@ -155,6 +156,9 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<IQeyeV2MD, Cam>("IQeyeV2MD", "IQeye", K::kMotion,
                           "motion data pushed at /now.motiondata; motion while a line "
                           "window=N;level=L;threshold=T has L > T"),
+      Row<JVCEID, Cam, Inputs>("JVCEID", "JVC", K::kInput,
+                               "GET /api/param?peripheral.input_pin.pin(N).status once a second "
+                               "for N = 1..inputs, up to the first line ...=make&200"),
       Row<JVCJpgMD, Cam, Buf, Api>("JVCJpgMD", "JVC", K::kMotion,
                                    "JPEG frames of the API's stream (1, 2) or the frame buffer; "
                                    "motion while byte 233 of the COM segment is '1'"),

@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "detectors/jvc.h"
 #include "detectors/vivotek.h"
 #include "framework/host/camera.h"
 #include "sim/simulator.h"
@@ -53,6 +54,23 @@ TEST_F(PolledEmulationTest, VivotekInputCgisOfBothFamilies) {
   bool active = true;
   ASSERT_EQ(eid.DoEID(active), 0);
   EXPECT_FALSE(active);
+}
+
+TEST_F(PolledEmulationTest, JvcInputPins) {
+  Start("jvc");
+  Camera camera = MakeCamera(*cam_);
+  JVCEID eid(&camera, 2);
+  bool active = true;
+  ASSERT_EQ(eid.DoEID(active), 0);
+  EXPECT_FALSE(active);
+  cam_->state->SetInput(2, true);
+  ASSERT_EQ(eid.DoEID(active), 0);
+  EXPECT_TRUE(active);
+  std::string raw =
+      evtest::Exchange(cam_->port, evtest::GetRequest("/api/param?peripheral.input_pin.pin(2).status"));
+  EXPECT_NE(raw.find("\r\n\r\nperipheral.input_pin.pin(2).status=make&200\r\n"), std::string::npos) << raw;
+  raw = evtest::Exchange(cam_->port, evtest::GetRequest("/api/param?peripheral.output_pin.pin(1).status"));
+  EXPECT_EQ(raw.rfind("HTTP/1.1 400", 0), 0u) << raw;
 }
 
 }  // namespace
