@@ -16,6 +16,7 @@
 #include "detectors/jvc.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
+#include "detectors/messoa.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
 #include "detectors/vivotek.h"
@@ -162,6 +163,13 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<JVCJpgMD, Cam, Buf, Api>("JVCJpgMD", "JVC", K::kMotion,
                                    "JPEG frames of the API's stream (1, 2) or the frame buffer; "
                                    "motion while byte 233 of the COM segment is '1'"),
+      Row<MessoaMD, Cam>("MessoaMD", "Messoa", K::kMotion,
+                          "GET /cgi-bin/admin/param.cgi?type=Get&group=AlarmStatus once per "
+                          "interval; motion while Mode (after the [section] line) is 2 or 3"),
+      Row<MessoaEID, Cam, Inputs>("MessoaEID", "Messoa", K::kInput,
+                                  "GET /cgi-bin/admin/param.cgi?type=Get&group=AlarmStatus once "
+                                  "per interval; active while Mode (after the [section] line) is "
+                                  "1 or 3"),
       Row<PanaJpgED, Cam, Api, DetType, PanaGroup>(
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "

@@ -6,6 +6,7 @@
 #include <string>
 
 #include "detectors/jvc.h"
+#include "detectors/messoa.h"
 #include "detectors/vivotek.h"
 #include "framework/host/camera.h"
 #include "sim/simulator.h"
@@ -71,6 +72,34 @@ TEST_F(PolledEmulationTest, JvcInputPins) {
   EXPECT_NE(raw.find("\r\n\r\nperipheral.input_pin.pin(2).status=make&200\r\n"), std::string::npos) << raw;
   raw = evtest::Exchange(cam_->port, evtest::GetRequest("/api/param?peripheral.output_pin.pin(1).status"));
   EXPECT_EQ(raw.rfind("HTTP/1.1 400", 0), 0u) << raw;
+}
+
+TEST_F(PolledEmulationTest, MessoaModeCodes) {
+  Start("messoa");
+  Camera camera = MakeCamera(*cam_);
+  MessoaMD md(&camera);
+  MessoaEID eid(&camera, 1);
+  struct Case {
+    int motion;
+    bool input;
+    const char* mode;
+  };
+  for (const Case& c : {Case{0, false, "Mode=0"}, Case{0, true, "Mode=1"}, Case{40, false, "Mode=2"},
+                        Case{40, true, "Mode=3"}}) {
+    cam_->state->SetMotion(c.motion);
+    cam_->state->SetInput(1, c.input);
+    std::string raw = evtest::Exchange(
+        cam_->port, evtest::GetRequest("/cgi-bin/admin/param.cgi?type=Get&group=AlarmStatus"));
+    EXPECT_NE(raw.find(std::string("\r\n\r\n[AlarmStatus]\r\n") + c.mode + "\r\n"), std::string::npos) << raw;
+    bool state = !c.motion;
+    unsigned int level = 7;
+    ASSERT_EQ(md.DoMD(state, level), 0) << c.mode;
+    EXPECT_EQ(state, c.motion > 0) << c.mode;
+    EXPECT_EQ(level, c.motion > 0 ? 100u : 0u) << c.mode;
+    bool active = !c.input;
+    ASSERT_EQ(eid.DoEID(active), 0) << c.mode;
+    EXPECT_EQ(active, c.input) << c.mode;
+  }
 }
 
 }  // namespace
