@@ -17,6 +17,7 @@ Emulation HikVisionEmulation();
 Emulation IpuxEmulation();
 Emulation IqeyeEmulation();
 Emulation JvcEmulation();
+Emulation LevelOneEmulation();
 Emulation MessoaEmulation();
 Emulation PanasonicEmulation();
 Emulation PsiaEmulation();
@@ -39,6 +40,7 @@ const std::vector<Emulation>& Emulations() {
       IpuxEmulation(),
       IqeyeEmulation(),
       JvcEmulation(),
+      LevelOneEmulation(),
       MessoaEmulation(),
       PanasonicEmulation(),
       PsiaEmulation(),

@@ -14,6 +14,7 @@
 #include "detectors/ipux.h"
 #include "detectors/iqeye.h"
 #include "detectors/jvc.h"
+#include "detectors/levelone.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
 #include "detectors/messoa.h"
@@ -163,6 +164,14 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<JVCJpgMD, Cam, Buf, Api>("JVCJpgMD", "JVC", K::kMotion,
                                    "JPEG frames of the API's stream (1, 2) or the frame buffer; "
                                    "motion while byte 233 of the COM segment is '1'"),
+      Row<LevelOneGr2MD, Cam>("LevelOneGr2MD", "LevelOne", K::kMotion,
+                              "GET /cgi-bin/admin/param?action=list&group=Motion, then one line "
+                              "R1=..,R2=..,R3=.. from TCP port 19999, once per interval; motion "
+                              "while an enabled window's reading exceeds its threshold"),
+      Row<LevelOneGr1EID, Cam, Inputs>("LevelOneGr1EID", "LevelOne", K::kInput,
+                                       "GET /io/query_io.cgi once per interval for each input N = "
+                                       "1..inputs; the reading is the last input's line "
+                                       "input_N=1"),
       Row<MessoaMD, Cam>("MessoaMD", "Messoa", K::kMotion,
                           "GET /cgi-bin/admin/param.cgi?type=Get&group=AlarmStatus once per "
                           "interval; motion while Mode (after the [section] line) is 2 or 3"),
