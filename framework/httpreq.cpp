@@ -21,7 +21,8 @@ bool BeginsWith(const char* text, const std::string& prefix) {
 
 }  // namespace
 
-CgiRequest::CgiRequest(Camera* camera, const std::string& path, int timeout, int workSize) {
+CgiRequest::CgiRequest(Camera* camera, const std::string& path, int timeout, int workSize,
+                       ContentTypeRule rule) {
   if (camera == nullptr) return;
   client_.reset(new VoHttpClient(camera->GetHost(), camera->GetPort(), path,
                                  camera->GetUsername(), camera->GetPassword(), timeout));
@@ -29,6 +30,10 @@ CgiRequest::CgiRequest(Camera* camera, const std::string& path, int timeout, int
   std::string contentType;
   if (client_->SendRequest(VO_HTTP_GET) != 0) return;
   if (client_->CheckResponse(status) != 0) return;
+  if (rule == ContentTypeRule::kIgnored) {
+    ok_ = true;
+    return;
+  }
   if (client_->GetHttpContent(HTTP_CONTENT_TYPE, contentType) != 0) return;
   std::vector<char> work(static_cast<size_t>(workSize));
   snprintf(work.data(), work.size(), "%s", contentType.c_str());

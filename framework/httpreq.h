@@ -30,12 +30,19 @@ int SendHttpReqAndCheckResp(Camera* camera, std::string path, std::string key,
 int SendHttpReqAndGetResp(Camera* camera, std::string path, std::string key,
                           std::string& value);
 
+// Whether a request looks at the answer's Content-Type.
+enum class ContentTypeRule {
+  kRequired,  // the header and its first token must exist
+  kIgnored,   // the answer is read whatever its type, or none
+};
+
 // One CGI request, opened as every helper opens it: a new client on the camera's host, port
-// and credentials, a GET, a 2xx answer, and a Content-Type whose first token (delimiters
-// " :;=", taken from a copy cut to workSize - 1 characters) exists.
+// and credentials, a GET, a 2xx answer, and (unless `rule` is kIgnored) a Content-Type whose
+// first token (delimiters " :;=", taken from a copy cut to workSize - 1 characters) exists.
 class CgiRequest {
  public:
-  CgiRequest(Camera* camera, const std::string& path, int timeout, int workSize = 1024);
+  CgiRequest(Camera* camera, const std::string& path, int timeout, int workSize = 1024,
+             ContentTypeRule rule = ContentTypeRule::kRequired);
   ~CgiRequest();
   CgiRequest(const CgiRequest&) = delete;
   CgiRequest& operator=(const CgiRequest&) = delete;
@@ -43,7 +50,7 @@ class CgiRequest {
   // Whether every opening step succeeded (a null camera fails).
   bool Ok() const { return ok_; }
   // Whether the Content-Type's first token begins with `type`, compared without regard to
-  // case over type's length. False when the request failed.
+  // case over type's length. False when the request failed or the type was not read.
   bool ContentTypeIs(const char* type) const;
   // The open client, for reading the body. REQUIRES: Ok().
   VoHttpClient& Client() { return *client_; }

@@ -98,16 +98,18 @@ json CameraJson(const SimCamera& camera) {
   CameraStatus status = camera.state->Get();
   json inputs = json::array();
   for (bool on : status.inputs) inputs.push_back(on ? 1 : 0);
-  return json{{"name", camera.name},
-              {"maker", camera.emulation->maker},
-              {"emulation", camera.emulation->key},
-              {"port", camera.port},
-              {"classes", camera.emulation->classes},
-              {"state",
-               {{"motion", status.motion},
-                {"inputs", inputs},
-                {"silent", status.silent},
-                {"requests", camera.state->Requests()}}}};
+  json out{{"name", camera.name},
+           {"maker", camera.emulation->maker},
+           {"emulation", camera.emulation->key},
+           {"port", camera.port},
+           {"classes", camera.emulation->classes},
+           {"state",
+            {{"motion", status.motion},
+             {"inputs", inputs},
+             {"silent", status.silent},
+             {"requests", camera.state->Requests()}}}};
+  if (!camera.host.empty()) out["host"] = camera.host;
+  return out;
 }
 
 void HandleControlRequest(HttpConnection& connection, const std::vector<SimCamera>& cameras,

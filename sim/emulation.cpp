@@ -17,6 +17,8 @@ Emulation HikVisionEmulation();
 Emulation IpuxEmulation();
 Emulation IqeyeEmulation();
 Emulation JvcEmulation();
+Emulation LevelOneEmulation();
+Emulation MessoaEmulation();
 Emulation PanasonicEmulation();
 Emulation PsiaEmulation();
 Emulation SanyoEmulation();
@@ -38,6 +40,8 @@ const std::vector<Emulation>& Emulations() {
       IpuxEmulation(),
       IqeyeEmulation(),
       JvcEmulation(),
+      LevelOneEmulation(),
+      MessoaEmulation(),
       PanasonicEmulation(),
       PsiaEmulation(),
       SanyoEmulation(),

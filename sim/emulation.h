@@ -56,6 +56,10 @@ struct Emulation {
   // own thread; the connection closes when it returns. Runs after the simulator has counted
   // the connection and waited out silence.
   std::function<void(TcpConnection&, CameraState&, const Login&)> tcp_service;
+  // Optional, for a camera with a TCP service: the port the service must listen on, for a
+  // camera whose clients always connect to that port. Such a camera listens on an address
+  // of its own (SimOptions::fixed_port_host); 0: a free port on the simulator's address.
+  int fixed_tcp_port = 0;
   // Optional, for a camera with a TCP service: answers an HTTP request in place of `handle`,
   // knowing the service's port (the camera's CGIs tell clients where it listens).
   std::function<void(HttpConnection&, CameraState&, int tcp_port)> handle_with_tcp_port;

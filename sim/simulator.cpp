@@ -1,6 +1,7 @@
 #include "sim/simulator.h"
 
 #include <chrono>
+#include <random>
 
 #include "sim/controlapi.h"
 
@@ -49,6 +50,19 @@ void ServeTcp(TcpConnection& connection, CameraState& state, const Emulation& em
   emulation.tcp_service(connection, state, login);
 }
 
+// The addresses to try, in order, for a camera whose TCP service has a fixed port.
+std::vector<std::string> FixedPortHosts(const std::string& option) {
+  if (option != "auto") return {option};
+  std::vector<std::string> hosts = {"127.0.0.1"};
+  std::mt19937 random(std::random_device{}());
+  std::uniform_int_distribution<int> octet(1, 254);
+  for (int i = 0; i < 64; ++i) {
+    hosts.push_back("127." + std::to_string(octet(random)) + "." + std::to_string(octet(random)) +
+                    "." + std::to_string(octet(random)));
+  }
+  return hosts;
+}
+
 }  // namespace
 
 Simulator::Simulator() = default;
@@ -82,22 +96,41 @@ bool Simulator::Start(const SimOptions& options, std::string* error) {
       auto station = std::make_unique<Station>();
       CameraState* state = &station->state;
       int tcp_port = 0;
-      if (e->tcp_service) {
-        station->tcp = std::make_unique<TcpServer>(
-            [state, e, login](TcpConnection& c) { ServeTcp(c, *state, *e, login); },
-            options.host, 0);
+      std::string host = options.host;
+      std::string own_host;  // set for a camera on an address of its own
+      auto tcp_session = [state, e, login](TcpConnection& c) { ServeTcp(c, *state, *e, login); };
+      if (e->tcp_service && e->fixed_tcp_port > 0) {
+        if (!options.fixed_port_host.empty()) {
+          for (const std::string& candidate : FixedPortHosts(options.fixed_port_host)) {
+            auto tcp = std::make_unique<TcpServer>(tcp_session, candidate, e->fixed_tcp_port);
+            if (tcp->Port() != e->fixed_tcp_port) continue;
+            station->tcp = std::move(tcp);
+            tcp_port = e->fixed_tcp_port;
+            host = own_host = candidate;
+            break;
+          }
+          if (!station->tcp) {
+            *error = "cannot listen on " + options.fixed_port_host + " port " +
+                     std::to_string(e->fixed_tcp_port) + " for camera " + e->key +
+                     std::to_string(n) + " (another simulator may hold it; try --fixed-port-host auto)";
+            Stop();
+            return false;
+          }
+        }
+      } else if (e->tcp_service) {
+        station->tcp = std::make_unique<TcpServer>(tcp_session, options.host, 0);
         tcp_port = station->tcp->Port();
       }
       station->server = std::make_unique<HttpServer>(
           [state, e, auth, tcp_port](HttpConnection& c) { Serve(c, *state, *e, auth, tcp_port); },
-          options.host, 0);
+          host, 0);
       if (station->server->Port() <= 0 || (station->tcp && tcp_port <= 0)) {
-        *error = "cannot listen on " + options.host + " for camera " + e->key + std::to_string(n);
+        *error = "cannot listen on " + host + " for camera " + e->key + std::to_string(n);
         Stop();
         return false;
       }
-      cameras_.push_back(
-          SimCamera{e->key + std::to_string(n), e, station->server->Port(), state, tcp_port});
+      cameras_.push_back(SimCamera{e->key + std::to_string(n), e, station->server->Port(), state,
+                                   tcp_port, own_host});
       stations_.push_back(std::move(station));
     }
   }

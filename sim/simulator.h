@@ -1,6 +1,7 @@
 // The camera simulator: simulated cameras of chosen emulations, each an HTTP server on its
 // own loopback port answering from its CameraState (plus a raw TCP server on a second port
-// for an emulation with a TCP service), a control API to read and set those
+// for an emulation with a TCP service; a camera whose service has a fixed port listens on a
+// loopback address of its own), a control API to read and set those
 // states, and optionally the demo scenario playing over them. Used by camsim, the demo,
 // the tests and the benchmarks.
 //
@@ -40,6 +41,10 @@ struct SimOptions {
   std::string user;
   std::string password;
   bool scenario = false;                // play Scenario::Demo over the cameras
+  // Where a camera whose TCP service has a fixed port listens (its HTTP server too): an
+  // address; "auto": 127.0.0.1 when the port is free there, else a random loopback address,
+  // one per camera; empty: such cameras run without their TCP service, on `host`.
+  std::string fixed_port_host;
 };
 
 struct SimCamera {
@@ -48,6 +53,7 @@ struct SimCamera {
   int port = 0;
   CameraState* state = nullptr;  // owned by the simulator
   int tcp_port = 0;              // the TCP service's port; 0 when the emulation has none
+  std::string host;              // the camera's own address; empty: SimOptions::host
 };
 
 class Simulator {

@@ -1,6 +1,7 @@
 // camsim: simulated network cameras on loopback, for evwatch, its tests and benchmarks.
 //
 //   camsim [-e KEY]... [-n COUNT] [--scenario demo|none] [--control-port P]
+//          [--fixed-port-host ADDRESS|auto]
 //          [--auth none|basic|digest --user U --password P] [--duration SECONDS]
 //          [--format json|text] [--evwatch-config FILE] [--interval MS]
 //   camsim --list
@@ -35,7 +36,8 @@ void List() {
 
 void PrintText(const evsim::Simulator& simulator, const std::string& host) {
   for (const evsim::SimCamera& c : simulator.Cameras()) {
-    std::cout << c.name << "\t" << c.emulation->maker << "\t" << host << ":" << c.port << "\t";
+    std::cout << c.name << "\t" << c.emulation->maker << "\t" << (c.host.empty() ? host : c.host)
+              << ":" << c.port << "\t";
     for (size_t i = 0; i < c.emulation->classes.size(); ++i) {
       std::cout << (i ? "," : "") << c.emulation->classes[i];
     }
@@ -59,6 +61,9 @@ int main(int argc, char** argv) {
   app.add_option("-e,--emulation", options.emulations, "emulation to run (repeatable; default: all)");
   app.add_option("-n,--count", options.count, "cameras of each emulation")->check(CLI::Range(1, 5000));
   app.add_option("--host", options.host, "address to listen on");
+  app.add_option("--fixed-port-host", options.fixed_port_host,
+                 "address (or auto) for cameras whose TCP service has a fixed port, such as "
+                 "LevelOne's 19999; unset: they run without that service");
   app.add_option("--control-port", options.control_port, "control API port (0: a free port)")
       ->check(CLI::Range(0, 65535));
   app.add_option("--scenario", scenario, "demo: motion and inputs change every few seconds")

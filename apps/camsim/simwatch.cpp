@@ -14,7 +14,7 @@ std::vector<evwatch::WatchedCamera> SimWatch(const std::vector<SimCamera>& camer
     }
     if (c.detectors.empty()) continue;
     c.name = camera.name;
-    c.host = options.host;
+    c.host = camera.host.empty() ? options.host : camera.host;
     c.port = camera.port;
     c.user = options.user;
     c.password = options.password;

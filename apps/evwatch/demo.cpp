@@ -114,8 +114,10 @@ class Camsim {
     setpgid(0, 0);
     prctl(PR_SET_PDEATHSIG, SIGTERM);
     dup2(out, STDOUT_FILENO);
-    std::vector<std::string> args = {path, "--scenario", "demo", "--format", "json", "--evwatch-config",
-                                     config_};
+    // LevelOne's reading port is fixed: its camera takes 127.0.0.1, or an address of its
+    // own when another simulator holds that port.
+    std::vector<std::string> args = {path, "--scenario", "demo", "--format", "json", "--fixed-port-host",
+                                     "auto", "--evwatch-config", config_};
     std::vector<char*> argv;
     for (std::string& a : args) argv.push_back(a.data());
     argv.push_back(nullptr);

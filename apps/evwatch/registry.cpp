@@ -14,10 +14,14 @@
 #include "detectors/hikvision.h"
 #include "detectors/ipux.h"
 #include "detectors/iqeye.h"
+#include "detectors/jvc.h"
+#include "detectors/levelone.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
+#include "detectors/messoa.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
+#include "detectors/vivotek.h"
 #include "detectors/ycam.h"
 #include "detectors/zavio.h"
 #include "framework/host/camera.h"
@@ -159,9 +163,27 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<IQeyeV2MD, Cam>("IQeyeV2MD", "IQeye", K::kMotion,
                           "motion data pushed at /now.motiondata; motion while a line "
                           "window=N;level=L;threshold=T has L > T"),
+      Row<JVCEID, Cam, Inputs>("JVCEID", "JVC", K::kInput,
+                               "GET /api/param?peripheral.input_pin.pin(N).status once a second "
+                               "for N = 1..inputs, up to the first line ...=make&200"),
       Row<JVCJpgMD, Cam, Buf, Api>("JVCJpgMD", "JVC", K::kMotion,
                                    "JPEG frames of the API's stream (1, 2) or the frame buffer; "
                                    "motion while byte 233 of the COM segment is '1'"),
+      Row<LevelOneGr2MD, Cam>("LevelOneGr2MD", "LevelOne", K::kMotion,
+                              "GET /cgi-bin/admin/param?action=list&group=Motion, then one line "
+                              "R1=..,R2=..,R3=.. from TCP port 19999, once per interval; motion "
+                              "while an enabled window's reading exceeds its threshold"),
+      Row<LevelOneGr1EID, Cam, Inputs>("LevelOneGr1EID", "LevelOne", K::kInput,
+                                       "GET /io/query_io.cgi once per interval for each input N = "
+                                       "1..inputs; the reading is the last input's line "
+                                       "input_N=1"),
+      Row<MessoaMD, Cam>("MessoaMD", "Messoa", K::kMotion,
+                          "GET /cgi-bin/admin/param.cgi?type=Get&group=AlarmStatus once per "
+                          "interval; motion while Mode (after the [section] line) is 2 or 3"),
+      Row<MessoaEID, Cam, Inputs>("MessoaEID", "Messoa", K::kInput,
+                                  "GET /cgi-bin/admin/param.cgi?type=Get&group=AlarmStatus once "
+                                  "per interval; active while Mode (after the [section] line) is "
+                                  "1 or 3"),
       Row<PanaJpgED, Cam, Api, DetType, PanaGroup>(
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "
@@ -179,6 +201,11 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),
+      Row<VivotekEID, Cam, VivoGroup, Inputs>(
+          "VivotekEID", "Vivotek", K::kInput,
+          "GET /cgi-bin/getdi.cgi?diN for N = 1..inputs (function group 0, 1; line DIN=H) or "
+          "/cgi-bin/dido/getdi.cgi?diN for N = 0..inputs-1 (2, 3; line diN=1) once per interval, "
+          "up to the first active input; other groups fail"),
       Row<VivotekJpgMD, Cam, Buf, Api, VivoGroup>(
           "VivotekJpgMD", "Vivotek", K::kMotion,
           "JPEG frames of the API's stream (1, 2) or the frame buffer; motion flag and level in "

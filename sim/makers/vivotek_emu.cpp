@@ -6,7 +6,11 @@
 //   APP2: "VIVO" and the tag "jpeg", 11 bytes later a record count (1), then the record:
 //         a valid bit, a trigger bit and a 7-bit level (0..127), most significant bit first.
 // The frames have no JFIF header: its APP0 would come before the camera's own.
+// The digital inputs answer at two CGIs, one per firmware family: /cgi-bin/getdi.cgi?diN
+// (N from 1) says "DIN=H" or "DIN=L", /cgi-bin/dido/getdi.cgi?diN (N from 0) "diN=1" or
+// "diN=0".
 
+#include <algorithm>
 #include <string>
 #include <vector>
 
@@ -17,6 +21,8 @@ namespace evsim {
 namespace {
 
 constexpr char kStreamPath[] = "/video.mjpg";
+constexpr char kInputPathFromOne[] = "/cgi-bin/getdi.cgi";
+constexpr char kInputPathFromZero[] = "/cgi-bin/dido/getdi.cgi";
 constexpr int kFps = 10;
 constexpr int kBufferFps = 100;  // the receiver of the frame buffer reads at full speed
 
@@ -43,7 +49,33 @@ std::string App2Record(const CameraStatus& status) {
   return r + record;
 }
 
+// Answers an input CGI of either family; false, writing nothing, for any other request.
+bool AnswerInput(HttpConnection& connection, const CameraState& state) {
+  const HttpRequest& request = connection.Request();
+  const std::string path = request.Path();
+  const bool fromOne = path == kInputPathFromOne;
+  if (request.method != "GET" || (!fromOne && path != kInputPathFromZero)) return false;
+  const std::string query = request.target.substr(std::min(request.target.size(), path.size() + 1));
+  int index = -1;
+  if (query.size() > 2 && query.compare(0, 2, "di") == 0 &&
+      query.find_first_not_of("0123456789", 2) == std::string::npos && query.size() < 6) {
+    index = std::stoi(query.substr(2));
+  }
+  const int input = fromOne ? index : index + 1;
+  if (index < 0 || input < 1 || input > kInputCount) {
+    connection.Write(MakeResponse(400, "text/plain", "bad input\r\n"));
+    return true;
+  }
+  const bool active = state.Get().Input(input);
+  const std::string number = std::to_string(index);
+  const std::string line = fromOne ? "DI" + number + "=" + (active ? "H" : "L")
+                                   : "di" + number + "=" + (active ? "1" : "0");
+  connection.Write(MakeResponse(200, "text/plain", line + "\r\n"));
+  return true;
+}
+
 void HandleVivotek(HttpConnection& connection, CameraState& state) {
+  if (AnswerInput(connection, state)) return;
   if (!ServesGetOf(connection, kStreamPath)) return;
   const HttpRequest& request = connection.Request();
   ServeEventFrames(connection, state, FramePeriod(request, kFps), [](const CameraStatus& status) {
@@ -60,6 +92,7 @@ Emulation VivotekEmulation() {
                              {
                                  {"VivotekJpgMD", "motion", {{"function_group", 0}}},
                                  {"VivotekJpgMD", "motion-app2", {{"function_group", 1}, {"stream_buffer", true}}},
+                                 {"VivotekEID", "inputs", {{"function_group", 0}, {"inputs", 2}}},
                              });
   e.api = StreamApi(kStreamPath);
   e.frames = FramesAt(std::string(kStreamPath) + "?fps=" + std::to_string(kBufferFps));

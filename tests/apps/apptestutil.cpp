@@ -118,7 +118,8 @@ std::optional<TextLine> ParseTextLine(const std::string& line) {
 
 Camsim::Camsim(const TempDir& dir, std::vector<std::string> args) {
   config_path_ = dir.Path() + "/camsim-evwatch.json";
-  std::vector<std::string> argv = {CamsimPath(), "--evwatch-config", config_path_};
+  // Fixed-port cameras on addresses of their own, beside any demo on 127.0.0.1.
+  std::vector<std::string> argv = {CamsimPath(), "--fixed-port-host", "auto", "--evwatch-config", config_path_};
   argv.insert(argv.end(), args.begin(), args.end());
   process_ = std::make_unique<ChildProcess>(argv);
   if (!process_->Started()) return;

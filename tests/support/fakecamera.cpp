@@ -72,9 +72,10 @@ struct FakeCamera::Script {
   Handler handler;
 };
 
-FakeCamera::FakeCamera()
-    : server_(std::make_unique<evsim::HttpServer>(
-          [this](evsim::HttpConnection& connection) { Serve(connection); })) {}
+FakeCamera::FakeCamera(const std::string& host)
+    : host_(host),
+      server_(std::make_unique<evsim::HttpServer>(
+          [this](evsim::HttpConnection& connection) { Serve(connection); }, host)) {}
 
 FakeCamera::~FakeCamera() { server_->Stop(); }
 
@@ -82,7 +83,7 @@ int FakeCamera::Port() const { return server_->Port(); }
 
 CameraRecord FakeCamera::Record(const std::string& user, const std::string& password) const {
   CameraRecord record;
-  record.host = "127.0.0.1";
+  record.host = host_;
   record.port = Port();
   record.username = user;
   record.password = password;
@@ -201,11 +202,11 @@ class RawSession : public RawConnection {
 };
 
 struct RawTcpServer::Impl {
-  explicit Impl(Script script)
+  Impl(Script script, const std::string& host, int port)
       : server([this, s = std::move(script)](evsim::TcpConnection& tcp) {
           RawSession session(tcp, [this](std::string bytes) { Record(std::move(bytes)); });
           s(session);
-        }) {}
+        }, host, port) {}
 
   void Record(std::string bytes) {
     std::lock_guard<std::mutex> lock(mutex);
@@ -217,7 +218,8 @@ struct RawTcpServer::Impl {
   evsim::TcpServer server;            // last: stops before the log goes away
 };
 
-RawTcpServer::RawTcpServer(Script script) : impl_(std::make_unique<Impl>(std::move(script))) {}
+RawTcpServer::RawTcpServer(Script script, const std::string& host, int port)
+    : impl_(std::make_unique<Impl>(std::move(script), host, port)) {}
 
 RawTcpServer::~RawTcpServer() { impl_->server.Stop(); }
 

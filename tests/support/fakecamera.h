@@ -82,7 +82,8 @@ class FakeCamera {
  public:
   using Handler = std::function<void(evsim::HttpConnection&)>;
 
-  FakeCamera();
+  // Listens on a free port of `host` (a loopback address).
+  explicit FakeCamera(const std::string& host = "127.0.0.1");
   ~FakeCamera();
   FakeCamera(const FakeCamera&) = delete;
   FakeCamera& operator=(const FakeCamera&) = delete;
@@ -117,6 +118,7 @@ class FakeCamera {
   std::map<std::string, std::shared_ptr<Script>> scripts_;  // guarded by mutex_
   std::vector<SeenRequest> log_;                            // guarded by mutex_
   evsim::HttpAuth auth_;                                    // guarded by mutex_
+  const std::string host_;
   std::unique_ptr<evsim::HttpServer> server_;
 };
 
@@ -137,8 +139,9 @@ class RawConnection {
 class RawTcpServer {
  public:
   using Script = std::function<void(RawConnection&)>;
-  // Runs script once per accepted connection, each on its own thread.
-  explicit RawTcpServer(Script script);
+  // Runs script once per accepted connection, each on its own thread. Listens on
+  // host:port (port 0: a free port); Port() is 0 when that cannot be bound.
+  explicit RawTcpServer(Script script, const std::string& host = "127.0.0.1", int port = 0);
   ~RawTcpServer();
   RawTcpServer(const RawTcpServer&) = delete;
   RawTcpServer& operator=(const RawTcpServer&) = delete;
