@@ -20,6 +20,7 @@
 #include "apps/common/endwait.h"
 #include "apps/evwatch/config.h"
 #include "apps/evwatch/demo.h"
+#include "apps/evwatch/health.h"
 #include "apps/evwatch/registry.h"
 #include "apps/evwatch/runner.h"
 #include "apps/evwatch/sink.h"
@@ -57,6 +58,13 @@ int Run(const std::string& file, bool every, std::optional<double> seconds, cons
   if (!config) return kExitUsage;
   evwatch::Sink sink(std::cout, format == "text" ? evwatch::OutputFormat::kText : evwatch::OutputFormat::kJsonl,
                      every);
+  // Camera health goes to stderr as our host's transfers report it.
+  evwatch::CameraHealth health(*config, std::cerr);
+  sink.SetFailing([&health](const std::string& camera) { return health.Failing(camera); });
+  SetTransferObserver([&health](const TransferOutcome& outcome) { health.OnTransfer(outcome); });
+  struct ObserverEnd {
+    ~ObserverEnd() { SetTransferObserver(nullptr); }
+  } observer_end;
   evwatch::Runner runner(std::move(*config), sink, std::cerr);
   std::string error;
   if (!runner.Start(&error)) {

@@ -46,7 +46,7 @@ int Sink::Add(std::string camera, std::string detector, std::string cls, Detecto
   return static_cast<int>(entries_.size()) - 1;
 }
 
-std::string Sink::Line(const Entry& e, const StatusReport& report) const {
+std::string Sink::Line(const Entry& e, const StatusReport& report, bool unreachable) const {
   if (format_ == OutputFormat::kJsonl) {
     nlohmann::ordered_json line = {{"ts", IsoTime(report.time)},
                                    {"camera", e.camera},
@@ -60,7 +60,9 @@ std::string Sink::Line(const Entry& e, const StatusReport& report) const {
   // whether the reading was valid (0 also closes a detector's run), or with its level.
   const bool motion = e.kind == DetectorKind::kMotion;
   const bool level = motion || e.kind == DetectorKind::kInputLevel;
-  const char* words = motion ? (report.state ? "MOTION" : "no motion") : (report.state ? "ACTIVE" : "idle");
+  const char* words = unreachable ? "unreachable"
+                      : motion    ? (report.state ? "MOTION" : "no motion")
+                                  : (report.state ? "ACTIVE" : "idle");
   std::ostringstream line;
   line << LocalTime(report.time) << "  " << std::left << std::setw(12) << e.camera << ' '
        << std::setw(16) << e.detector << ' ' << std::setw(10) << words << ' '
@@ -72,12 +74,17 @@ void Sink::Report(int handle, const StatusReport& report) {
   std::lock_guard<std::mutex> lock(mutex_);
   if (handle < 0 || static_cast<size_t>(handle) >= entries_.size()) return;
   Entry& e = entries_[handle];
-  const bool changed = !e.reported || e.state != report.state || e.value != report.value;
+  // A failed reading is (false, 0), as is a quiet one; the text format tells them apart.
+  const bool unreachable = format_ == OutputFormat::kText && failing_ && !report.state && report.value == 0 &&
+                           failing_(e.camera);
+  const bool changed =
+      !e.reported || e.state != report.state || e.value != report.value || e.unreachable != unreachable;
   e.reported = true;
   e.state = report.state;
   e.value = report.value;
+  e.unreachable = unreachable;
   if (!changed && !every_) return;
-  out_ << Line(e, report) << '\n' << std::flush;
+  out_ << Line(e, report, unreachable) << '\n' << std::flush;
   if (!out_) failed_ = true;
   ++e.lines;
 }

@@ -10,6 +10,7 @@
 #define EVWATCH_APPS_EVWATCH_SINK_H_
 
 #include <atomic>
+#include <functional>
 #include <map>
 #include <mutex>
 #include <ostream>
@@ -35,6 +36,11 @@ class Sink {
   int Add(std::string camera, std::string detector, std::string cls, DetectorKind kind);
   void Report(int handle, const StatusReport& report);
 
+  // For the text format: whether a camera's requests are failing now. A detector's (false, 0)
+  // then reads "unreachable" instead of "no motion" or "idle"; the JSON lines do not change.
+  // REQUIRES: set before the detectors start.
+  void SetFailing(std::function<bool(const std::string& camera)> failing) { failing_ = std::move(failing); }
+
   // Whether a write has failed (the output was closed).
   bool Failed() const { return failed_.load(); }
   // How many lines each camera's detectors have printed, by camera name.
@@ -47,13 +53,14 @@ class Sink {
     std::string cls;
     DetectorKind kind;
     bool reported = false;  // whether state/value hold a previous report
+    bool unreachable = false;  // the text format said so for the previous report
     size_t lines = 0;       // printed so far
     bool state = false;
     int value = 0;
   };
 
   // One line without its newline.
-  std::string Line(const Entry& e, const StatusReport& report) const;
+  std::string Line(const Entry& e, const StatusReport& report, bool unreachable) const;
 
   std::ostream& out_;
   const OutputFormat format_;
@@ -61,6 +68,7 @@ class Sink {
   mutable std::mutex mutex_;
   std::vector<Entry> entries_;  // by handle; guarded by mutex_
   std::atomic<bool> failed_{false};
+  std::function<bool(const std::string& camera)> failing_;
 };
 
 // "2026-11-20T12:00:00.123Z" (UTC).

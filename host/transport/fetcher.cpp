@@ -8,6 +8,7 @@
 
 #include "host/text/strutil.h"
 #include "host/transport/httppull.h"
+#include "host/transport/transfernote.h"
 
 namespace {
 
@@ -128,6 +129,7 @@ class MultipartStream {
   std::string boundary_;   // delimiter line "--" + parameter; empty: the first "--" line
   std::string alternate_;  // the parameter as a delimiter when it already starts with "--"
   bool line_start_ = true;  // the next byte of the stream begins a line
+  bool streaming_ = false;  // a stream is open (noted as answering)
   bool at_header_ = false;  // the boundary line before the next part's header is consumed
   bool in_part_ = false;    // a part header was read and that part is current
   bool stored_ = false;     // the current body was read to its boundary into body_
@@ -151,11 +153,13 @@ bool MultipartStream::Connect() {
   pull_ = std::make_unique<HttpPull>(target_);
   std::string type;
   std::string parameter;
-  if (!pull_->Start(false) || pull_->Status() < 200 || pull_->Status() > 299 ||
-      !pull_->Header("Content-Type", &type) || !ParseMultipartType(type, &parameter) ||
+  if (!pull_->Start(false) || pull_->Status() < 200 || pull_->Status() > 299) return false;
+  if (!pull_->Header("Content-Type", &type) || !ParseMultipartType(type, &parameter) ||
       parameter.size() > kMaxBoundary) {
+    NoteTransfer(target_.host, target_.port, false, "the answer is not a multipart stream");
     return false;
   }
+  streaming_ = true;
   if (!parameter.empty()) {
     boundary_ = "--" + parameter;
     if (parameter.compare(0, 2, "--") == 0) alternate_ = parameter;
@@ -164,12 +168,14 @@ bool MultipartStream::Connect() {
 }
 
 int MultipartStream::Fail() {
+  if (streaming_) NoteTransfer(target_.host, target_.port, false, "the stream ended or broke off");
   Close();
   return -1;
 }
 
 void MultipartStream::Close() {
   pull_.reset();
+  streaming_ = false;
   boundary_.clear();
   alternate_.clear();
   line_start_ = true;

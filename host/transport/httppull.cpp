@@ -6,8 +6,22 @@
 #include <cstring>
 
 #include "host/text/strutil.h"
+#include "host/transport/transfernote.h"
 
 namespace {
+
+// A failed transfer's cause, in words.
+std::string FailureCause(CURLcode result) {
+  switch (result) {
+    case CURLE_COULDNT_RESOLVE_HOST: return "cannot resolve the host name";
+    case CURLE_COULDNT_CONNECT: return "connection refused or host unreachable";
+    case CURLE_OPERATION_TIMEDOUT: return "no answer in time";
+    case CURLE_GOT_NOTHING: return "the camera closed the connection without an answer";
+    case CURLE_RECV_ERROR:
+    case CURLE_SEND_ERROR: return "the connection was lost";
+    default: return curl_easy_strerror(result);
+  }
+}
 
 // A camera that sends header lines without end must not grow our header map without end.
 constexpr size_t kMaxHeaderBytes = 256 * 1024;
@@ -129,7 +143,20 @@ bool HttpPull::Start(bool head_only) {
     return false;
   }
   Pump([this] { return headers_in_; });
+  NoteOutcome();
   return headers_in_;
+}
+
+void HttpPull::NoteOutcome() const {
+  if (headers_in_) {
+    const bool ok = status_ >= 200 && status_ < 300;
+    NoteTransfer(target_.host, target_.port, ok, ok ? "" : HttpStatusCause(status_));
+  } else if (done_) {
+    NoteTransfer(target_.host, target_.port, false, FailureCause(result_));
+  } else {
+    NoteTransfer(target_.host, target_.port, false,
+                 "no answer within " + std::to_string(std::max(1, target_.timeout)) + " s");
+  }
 }
 
 int HttpPull::Status() const { return headers_in_ ? status_ : 0; }

@@ -68,6 +68,8 @@ class HttpPull {
  private:
   template <typename Done>
   Wait Pump(Done done);
+  // Tells the host program's transfer observer how the request went.
+  void NoteOutcome() const;
   void Perform();
   void Resume();
   bool Configure();

@@ -13,6 +13,7 @@
 #include <cstring>
 
 #include "host/transport/linesplit.h"
+#include "host/transport/transfernote.h"
 
 namespace {
 
@@ -88,12 +89,16 @@ int VoSocket::BuildConnect() {
   hints.ai_socktype = SOCK_STREAM;
   hints.ai_flags = AI_NUMERICSERV;
   addrinfo* found = nullptr;
-  if (getaddrinfo(name.c_str(), std::to_string(port_).c_str(), &hints, &found) != 0) return -1;
+  if (getaddrinfo(name.c_str(), std::to_string(port_).c_str(), &hints, &found) != 0) {
+    NoteTransfer(host_, port_, false, "cannot resolve the host name");
+    return -1;
+  }
   const Clock::time_point deadline = Clock::now() + std::chrono::seconds(timeout_);
   for (addrinfo* address = found; address != nullptr && fd_ < 0; address = address->ai_next) {
     fd_ = ConnectOne(*address, deadline);
   }
   freeaddrinfo(found);
+  NoteTransfer(host_, port_, fd_ >= 0, "connection refused or host unreachable");
   return fd_ >= 0 ? 0 : -1;
 }
 
