@@ -17,6 +17,7 @@ Emulation HikVisionEmulation();
 Emulation IpuxEmulation();
 Emulation IqeyeEmulation();
 Emulation JvcEmulation();
+Emulation MobotixEmulation();
 Emulation PanasonicEmulation();
 Emulation PsiaEmulation();
 Emulation SanyoEmulation();
@@ -38,6 +39,7 @@ const std::vector<Emulation>& Emulations() {
       IpuxEmulation(),
       IqeyeEmulation(),
       JvcEmulation(),
+      MobotixEmulation(),
       PanasonicEmulation(),
       PsiaEmulation(),
       SanyoEmulation(),

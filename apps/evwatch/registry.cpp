@@ -15,6 +15,7 @@
 #include "detectors/iqeye.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
+#include "detectors/mobotix.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
 #include "detectors/ycam.h"
@@ -157,6 +158,10 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<JVCJpgMD, Cam, Buf, Api>("JVCJpgMD", "JVC", K::kMotion,
                                    "JPEG frames of the API's stream (1, 2) or the frame buffer; "
                                    "motion while byte 233 of the COM segment is '1'"),
+      Row<MobotixMD, Cam, DetType>("MobotixMD", "Mobotix", K::kBoth,
+                                   "GET /control/event.jpg?output=alarmupdate&filter=VM (type 0) "
+                                   "or filter=SI (type 1) once per interval; an event while the "
+                                   "first line's alarmcounter moved since the last reading"),
       Row<PanaJpgED, Cam, Api, DetType, PanaGroup>(
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "
