@@ -17,6 +17,7 @@ Emulation HikVisionEmulation();
 Emulation IpuxEmulation();
 Emulation IqeyeEmulation();
 Emulation JvcEmulation();
+Emulation MessoaProEmulation();
 Emulation MobotixEmulation();
 Emulation PanasonicEmulation();
 Emulation PsiaEmulation();
@@ -39,6 +40,7 @@ const std::vector<Emulation>& Emulations() {
       IpuxEmulation(),
       IqeyeEmulation(),
       JvcEmulation(),
+      MessoaProEmulation(),
       MobotixEmulation(),
       PanasonicEmulation(),
       PsiaEmulation(),

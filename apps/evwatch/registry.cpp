@@ -15,6 +15,7 @@
 #include "detectors/iqeye.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
+#include "detectors/messoapro.h"
 #include "detectors/mobotix.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
@@ -158,6 +159,12 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<JVCJpgMD, Cam, Buf, Api>("JVCJpgMD", "JVC", K::kMotion,
                                    "JPEG frames of the API's stream (1, 2) or the frame buffer; "
                                    "motion while byte 233 of the COM segment is '1'"),
+      Row<MessoaProMD, Cam, Api>("MessoaProMD", "MessoaPro", K::kMotion,
+                                 "GET the API's stream path and port once per interval; motion "
+                                 "while the answer's Alarm.Status is 2 or 3"),
+      Row<MessoaProEID, Cam, Api, Inputs>("MessoaProEID", "MessoaPro", K::kInput,
+                                          "GET the API's stream path and port once per interval; "
+                                          "active while Alarm.Status is 1 or 3 (inputs unused)"),
       Row<MobotixMD, Cam, DetType>("MobotixMD", "Mobotix", K::kBoth,
                                    "GET /control/event.jpg?output=alarmupdate&filter=VM (type 0) "
                                    "or filter=SI (type 1) once per interval; an event while the "
