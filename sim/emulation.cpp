@@ -23,6 +23,7 @@ Emulation PanasonicEmulation();
 Emulation PsiaEmulation();
 Emulation SanyoEmulation();
 Emulation SceneEmulation();
+Emulation StorageEmulation();
 Emulation VivotekEmulation();
 Emulation YcamEmulation();
 Emulation ZavioEmulation();
@@ -46,6 +47,7 @@ const std::vector<Emulation>& Emulations() {
       PsiaEmulation(),
       SanyoEmulation(),
       SceneEmulation(),
+      StorageEmulation(),
       VivotekEmulation(),
       YcamEmulation(),
       ZavioEmulation(),

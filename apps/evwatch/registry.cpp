@@ -19,6 +19,7 @@
 #include "detectors/mobotix.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
+#include "detectors/storage.h"
 #include "detectors/ycam.h"
 #include "detectors/zavio.h"
 #include "framework/host/camera.h"
@@ -186,6 +187,12 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),
+      Row<StorageMD, Cam, Api>("StorageMD", "Storage", K::kMotion,
+                               "GET the API's stream path and port once per interval; motion "
+                               "while the answer's alarm_status (its first ';' dropped) is 1 or 3"),
+      Row<StorageEID, Cam, Api, Inputs>("StorageEID", "Storage", K::kInput,
+                                        "GET the API's stream path and port once per interval; "
+                                        "active while alarm_status is 2 or 3 (inputs unused)"),
       Row<VivotekJpgMD, Cam, Buf, Api, VivoGroup>(
           "VivotekJpgMD", "Vivotek", K::kMotion,
           "JPEG frames of the API's stream (1, 2) or the frame buffer; motion flag and level in "

@@ -29,6 +29,9 @@ struct AlarmStatusMaker {
 constexpr AlarmStatusMaker kMessoaPro{
     "messoapro", "MessoaPro", "MessoaProMD", "MessoaProEID", "/cgi-bin/status.cgi", "group=Alarm",
     "Alarm.Status", 2, 1, "", "Alarm.Enable=1"};
+constexpr AlarmStatusMaker kStorage{
+    "storage", "Storage", "StorageMD", "StorageEID", "/cgi-bin/alarm.cgi", "action=status",
+    "alarm_status", 1, 2, ";", "disk_status=ok"};
 
 std::string StatusBody(const AlarmStatusMaker& m, const CameraStatus& status) {
   const int number = (status.motion > 0 ? m.motion_bit : 0) | (status.Input(1) ? m.input_bit : 0);
@@ -53,5 +56,6 @@ Emulation AlarmStatusEmulation(const AlarmStatusMaker& m) {
 }  // namespace
 
 Emulation MessoaProEmulation() { return AlarmStatusEmulation(kMessoaPro); }
+Emulation StorageEmulation() { return AlarmStatusEmulation(kStorage); }
 
 }  // namespace evsim
