@@ -10,6 +10,7 @@ Emulation ActiEmulation();
 Emulation AirLiveEmulation();
 Emulation AVIPCEmulation();
 Emulation AxisEmulation();
+Emulation BrickcomEmulation();
 Emulation CanonEmulation();
 Emulation ComproEmulation();
 Emulation DLinkEmulation();
@@ -34,6 +35,7 @@ const std::vector<Emulation>& Emulations() {
       AirLiveEmulation(),
       AVIPCEmulation(),
       AxisEmulation(),
+      BrickcomEmulation(),
       CanonEmulation(),
       ComproEmulation(),
       DLinkEmulation(),

@@ -7,6 +7,7 @@
 #include "detectors/airlive.h"
 #include "detectors/avipc.h"
 #include "detectors/axis.h"
+#include "detectors/brickcom.h"
 #include "detectors/canon.h"
 #include "detectors/compro.h"
 #include "detectors/dlink.h"
@@ -126,6 +127,10 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<AxisMD, Cam, Api>("AxisMD", "Axis", K::kMotion,
                             "motion data pushed at the API's stream path; motion while a line "
                             "group=G;level=L;threshold=T; has L > T"),
+      Row<BrickcomEID, Cam, Api, Inputs>("BrickcomEID", "Brickcom", K::kInput,
+                                         "GET /cgi-bin/gpio.cgi?action=get on the camera's port for "
+                                         "di1.status, di2.status, ... up to the first that reads 0 "
+                                         "(active); passes back to back, no pacing timer"),
       Row<CanonMD, Cam>("CanonMD", "Canon", K::kMotion,
                         "GET /-wvhttp-01-/info.cgi once a second; motion while a line says m.1:=1"),
       Row<CanonEID, Cam, Inputs>("CanonEID", "Canon", K::kInput,
