@@ -8,6 +8,7 @@ namespace evsim {
 // One per maker, each in its own file.
 Emulation ActiEmulation();
 Emulation AirLiveEmulation();
+Emulation ArecontEmulation();
 Emulation AVIPCEmulation();
 Emulation AxisEmulation();
 Emulation BrickcomEmulation();
@@ -33,6 +34,7 @@ const std::vector<Emulation>& Emulations() {
   static const std::vector<Emulation> table = {
       ActiEmulation(),
       AirLiveEmulation(),
+      ArecontEmulation(),
       AVIPCEmulation(),
       AxisEmulation(),
       BrickcomEmulation(),

@@ -5,6 +5,7 @@
 
 #include "detectors/acti/actidetector.h"
 #include "detectors/airlive.h"
+#include "detectors/arecont.h"
 #include "detectors/avipc.h"
 #include "detectors/axis.h"
 #include "detectors/brickcom.h"
@@ -115,6 +116,9 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                      "by the camera's id when not given), compared by the motion "
                                      "engine at the bound interval; level: % of the watched area "
                                      "that changed"),
+      Row<ARECONTMD, Cam, Api>("ARECONTMD", "Arecont", K::kMotion,
+                               "GET the API's stream path (on the camera's port) once a second; "
+                               "motion while the answer's mdresult does not contain \"no\""),
       Row<AVIPCEID, Cam, Inputs>("AVIPCEID", "AVIPC", K::kInput,
                                  "GET /cgi-bin/io/input.cgi?checkactive=N once a second for N = "
                                  "1..inputs, up to the first line inputN=active"),
