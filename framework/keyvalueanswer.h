@@ -80,7 +80,7 @@ class AlarmStatusEID : public DetectorBase {
  private:
   Camera* camera_;               // not owned
   CameraAPI* api_;               // not owned; names the status CGI
-  int unused_;                   // given by the host, not read
+  [[maybe_unused]] int unused_;  // given by the host, not read
   const AlarmStatusForm& form_;
 };
 
