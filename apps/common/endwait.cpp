@@ -3,9 +3,13 @@
 #include <pthread.h>
 #include <signal.h>
 
+#include <unistd.h>
+
+#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <ctime>
+#include <thread>
 
 namespace evwatch {
 namespace {
@@ -43,6 +47,24 @@ EndReason WaitForEnd(std::optional<double> seconds, const std::function<bool()>&
     struct timespec wait = {0, static_cast<long>(slice.count()) * 1000000L};
     if (sigtimedwait(&set, nullptr, &wait) > 0) return EndReason::kSignal;
   }
+}
+
+void RunUnlessSignalled(const std::function<void()>& work, const std::function<void(int)>& on_signal) {
+  std::atomic<bool> done{false};
+  std::thread watcher([&] {
+    const sigset_t set = EndSignals();
+    const struct timespec slice = {0, 50 * 1000000L};
+    while (!done) {
+      const int signal = sigtimedwait(&set, nullptr, &slice);
+      if (signal > 0) {
+        on_signal(signal);
+        _exit(128 + signal);
+      }
+    }
+  });
+  work();
+  done = true;
+  watcher.join();
 }
 
 }  // namespace evwatch

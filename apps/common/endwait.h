@@ -21,6 +21,10 @@ void BlockEndSignals();
 // holds (checked a few times a second).
 EndReason WaitForEnd(std::optional<double> seconds, const std::function<bool()>& failed);
 
+// Runs work() (a stop in progress). A SIGINT or SIGTERM meanwhile calls on_signal(signal) and
+// ends the process at once with status 128 + the signal's number (130, 143).
+void RunUnlessSignalled(const std::function<void()>& work, const std::function<void(int)>& on_signal);
+
 }  // namespace evwatch
 
 #endif  // EVWATCH_APPS_COMMON_ENDWAIT_H_

@@ -63,15 +63,25 @@ class Parser {
         Fail(cameras[i]["name"], Field(c.path, "name"), "duplicate camera name " + Quote(c.name));
       }
     }
+    config.warnings = warnings_;
     return config;
   }
 
  private:
-  [[noreturn]] void Fail(const YAML::Node& at, const std::string& path, const std::string& problem) {
+  // "FILE:LINE: PATH: " for a message about the node.
+  std::string Where(const YAML::Node& at, const std::string& path) const {
     std::string where = file_;
     YAML::Mark mark = at.IsDefined() ? at.Mark() : YAML::Mark::null_mark();
     if (mark.line >= 0) where += ":" + std::to_string(mark.line + 1);
-    throw Failure(where + ": " + (path.empty() ? "" : path + ": ") + problem);
+    return where + ": " + (path.empty() ? "" : path + ": ");
+  }
+
+  [[noreturn]] void Fail(const YAML::Node& at, const std::string& path, const std::string& problem) {
+    throw Failure(Where(at, path) + problem);
+  }
+
+  void Warn(const YAML::Node& at, const std::string& path, const std::string& problem) {
+    warnings_.push_back(Where(at, path) + "warning: " + problem);
   }
 
   // The node must be a map whose keys are distinct and all in `allowed`.
@@ -276,11 +286,19 @@ class Parser {
       }
       return value;
     };
-    if (const YAML::Node v = taken("inputs", kFieldInputs)) d.inputs = IntIn(v, Field(path, "inputs"), 0, 1024);
-    if (const YAML::Node v = taken("function_group", kFieldFunctionGroup)) {
-      d.function_group = IntIn(v, Field(path, "function_group"), 0, 1);
+    // Every int the constructor takes is passed on: the class defines what it does with it.
+    if (const YAML::Node v = taken("inputs", kFieldInputs)) {
+      d.inputs = Int(v, Field(path, "inputs"));
+      if (info->counts_inputs && d.inputs <= 0) {
+        Warn(v, Field(path, "inputs"), std::to_string(d.inputs) + ": " + d.cls +
+                                           " watches no input with a count of 0 or below and will never report "
+                                           "one active (it runs all the same)");
+      }
     }
-    if (const YAML::Node v = taken("type", kFieldType)) d.type = IntIn(v, Field(path, "type"), 0, 1);
+    if (const YAML::Node v = taken("function_group", kFieldFunctionGroup)) {
+      d.function_group = Int(v, Field(path, "function_group"));
+    }
+    if (const YAML::Node v = taken("type", kFieldType)) d.type = Int(v, Field(path, "type"));
     if (const YAML::Node v = taken("stream_buffer", kFieldStreamBuffer)) {
       d.stream_buffer = Bool(v, Field(path, "stream_buffer"));
       if (d.stream_buffer && !camera.frames) {
@@ -291,6 +309,7 @@ class Parser {
   }
 
   const std::string file_;
+  std::vector<std::string> warnings_;
 };
 
 }  // namespace

@@ -25,8 +25,8 @@ struct DetectorConfig {
   std::string name;              // unique within its camera; default: the class name
   std::optional<int> interval;   // ms; default: the file's interval
   int inputs = 1;                // the int constructor argument, for classes that take it
-  int function_group = 0;        // VIVO_FUNC_GR / PANA_FUNC_GR, for classes that take it
-  int type = 0;                  // EVENT_DET_TYPE, for classes that take it
+  int function_group = 0;        // VIVO_FUNC_GR / PANA_FUNC_GR, for classes that take it; any int
+  int type = 0;                  // EVENT_DET_TYPE, for classes that take it; any int
   bool stream_buffer = false;    // hand the camera's frame buffer to the constructor
 };
 
@@ -43,6 +43,9 @@ struct Config {
   std::string file;                  // as named on the command line
   int interval = 500;                // ms, the default Init interval
   std::vector<CameraConfig> cameras;  // at least one
+  // Values that pass the checks but make a detector useless, one line each, in the form of
+  // an error: "FILE:LINE: FIELD: warning: PROBLEM". Shown once, before the run.
+  std::vector<std::string> warnings;
 
   size_t DetectorCount() const;
 };

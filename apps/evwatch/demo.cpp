@@ -219,7 +219,9 @@ int RunDemo(std::optional<double> seconds, std::ostream& out, std::ostream& err)
     return 1;
   }
   WaitForEnd(seconds, [&sink] { return sink.Failed(); });
-  runner.Stop();
+  // A second Ctrl-C while the detectors stop ends the demo at once; the child simulator
+  // ends with it.
+  RunUnlessSignalled([&runner] { runner.Stop(); }, [&out](int) { out << std::flush; });
   simulator.Stop();
   return 0;
 }

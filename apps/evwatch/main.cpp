@@ -14,9 +14,9 @@
 #include <optional>
 #include <string>
 
+#include "apps/common/endwait.h"
 #include "apps/evwatch/config.h"
 #include "apps/evwatch/demo.h"
-#include "apps/common/endwait.h"
 #include "apps/evwatch/registry.h"
 #include "apps/evwatch/runner.h"
 #include "apps/evwatch/sink.h"
@@ -31,7 +31,22 @@ std::optional<evwatch::Config> Load(const std::string& file) {
   std::string error;
   std::optional<evwatch::Config> config = evwatch::LoadConfig(file, &error);
   if (!config) std::cerr << "evwatch: " << error << std::endl;
+  if (config) {
+    for (const std::string& warning : config->warnings) std::cerr << "evwatch: " << warning << "\n";
+    std::cerr << std::flush;
+  }
   return config;
+}
+
+// Stops every detector. After a signal it says so, since a stop may wait out a network
+// time-out; a second signal ends the process at once with what has been printed.
+void StopRunner(evwatch::Runner& runner, evwatch::EndReason end) {
+  if (end == evwatch::EndReason::kSignal) {
+    const size_t n = runner.DetectorCount();
+    std::cerr << "evwatch: stopping " << n << (n == 1 ? " detector" : " detectors") << " (at most "
+              << evwatch::Runner::kLongestStopSeconds << " s) ..." << std::endl;
+  }
+  evwatch::RunUnlessSignalled([&runner] { runner.Stop(); }, [](int) { std::cout << std::flush; });
 }
 
 int Run(const std::string& file, bool every, std::optional<double> seconds, const std::string& format) {
@@ -46,7 +61,7 @@ int Run(const std::string& file, bool every, std::optional<double> seconds, cons
     return kExitFailure;
   }
   evwatch::EndReason end = evwatch::WaitForEnd(seconds, [&sink] { return sink.Failed(); });
-  runner.Stop();
+  StopRunner(runner, end);
   if (end == evwatch::EndReason::kFailed) {
     std::cerr << "evwatch: cannot write the output any more; stopped" << std::endl;
     return kExitFailure;

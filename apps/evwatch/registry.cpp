@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <type_traits>
 
 #include "detectors/acti/actidetector.h"
 #include "detectors/airlive.h"
@@ -54,6 +55,9 @@ struct Inputs {
   static constexpr const char* kText = "int";
   static int Get(const DetectorArgs& a) { return a.inputs; }
 };
+// An input count: the class watches inputs 1..N (or 0..N-1), so a count of 0 or below
+// watches none.
+struct InputCount : Inputs {};
 struct VivoGroup {
   static constexpr unsigned kField = kFieldFunctionGroup;
   static constexpr const char* kText = "VIVO_FUNC_GR";
@@ -81,7 +85,8 @@ DetectorClass Row(const char* name, const char* maker, DetectorKind kind, const 
   return DetectorClass{name, maker, kind, signature, (0u | ... | Args::kField), how,
                        [](const DetectorArgs& a) -> std::unique_ptr<EventDetector> {
                          return std::make_unique<T>(Args::Get(a)...);
-                       }};
+                       },
+                       (false || ... || std::is_same_v<Args, InputCount>)};
 }
 
 }  // namespace
@@ -99,13 +104,13 @@ const char* KindName(DetectorKind kind) {
 const std::vector<DetectorClass>& DetectorClasses() {
   using K = DetectorKind;
   static const std::vector<DetectorClass> table = {
-      Row<ACTiEID, Cam, Inputs>("ACTiEID", "ACTi", K::kInput,
+      Row<ACTiEID, Cam, InputCount>("ACTiEID", "ACTi", K::kInput,
                                 "GET /cgi-bin/cmd/mpeg4?DIO_STATUS once a second; active while "
                                 "bit N of the hex value (two lowest bits) is 0"),
       Row<ACTiMD, Cam>("ACTiMD", "ACTi", K::kMotion,
                        "binary control connection to the port that /cgi-bin/cmd/system?"
                        "PORT_CONTROL gives; motion for each motion record (type 65593)"),
-      Row<AIRLIVEV1EID, Cam, Inputs>("AIRLIVEV1EID", "AirLive", K::kInput,
+      Row<AIRLIVEV1EID, Cam, InputCount>("AIRLIVEV1EID", "AirLive", K::kInput,
                                      "GET /io/input.cgi?checkactive=N once a second for N = 1.."
                                      "inputs, up to the first line inputN=active"),
       Row<AirliveV1MD, Cam>("AirliveV1MD", "AirLive", K::kMotion,
@@ -119,19 +124,19 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<ARECONTMD, Cam, Api>("ARECONTMD", "Arecont", K::kMotion,
                                "GET the API's stream path (on the camera's port) once a second; "
                                "motion while the answer's mdresult does not contain \"no\""),
-      Row<AVIPCEID, Cam, Inputs>("AVIPCEID", "AVIPC", K::kInput,
+      Row<AVIPCEID, Cam, InputCount>("AVIPCEID", "AVIPC", K::kInput,
                                  "GET /cgi-bin/io/input.cgi?checkactive=N once a second for N = "
                                  "1..inputs, up to the first line inputN=active"),
       Row<AvipcMD, Cam, Api>("AvipcMD", "AVIPC", K::kMotion,
                              "motion data pushed at the API's stream path; motion while a line "
                              "group=G;level=L;threshold=T; has L > T"),
-      Row<AXISEID, Cam, Inputs>("AXISEID", "Axis", K::kInput,
+      Row<AXISEID, Cam, InputCount>("AXISEID", "Axis", K::kInput,
                                 "GET /axis-cgi/io/input.cgi?checkactive=N once a second for N = "
                                 "1..inputs, up to the first line inputN=active"),
       Row<AxisMD, Cam, Api>("AxisMD", "Axis", K::kMotion,
                             "motion data pushed at the API's stream path; motion while a line "
                             "group=G;level=L;threshold=T; has L > T"),
-      Row<BrickcomEID, Cam, Api, Inputs>("BrickcomEID", "Brickcom", K::kInput,
+      Row<BrickcomEID, Cam, Api, InputCount>("BrickcomEID", "Brickcom", K::kInput,
                                          "GET /cgi-bin/gpio.cgi?action=get on the camera's port for "
                                          "di1.status, di2.status, ... up to the first that reads 0 "
                                          "(active); passes back to back, no pacing timer"),
@@ -146,7 +151,7 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<DLinkMD, Cam>("DLinkMD", "D-Link", K::kMotion,
                         "GET /config/notify.cgi once per interval; motion while md1=on, level "
                         "the camera's mdv1 value"),
-      Row<DLINKEID, Cam, Inputs>("DLINKEID", "D-Link", K::kInput,
+      Row<DLINKEID, Cam, InputCount>("DLINKEID", "D-Link", K::kInput,
                                  "GET /config/notify.cgi once a second per input N = 1..inputs, "
                                  "up to the first whose line says inputN=on"),
       Row<HikVisionMD, Cam>("HikVisionMD", "HikVision", K::kMotion,
@@ -192,7 +197,7 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<SanyoMD, Cam, Api>("SanyoMD", "Sanyo", K::kMotion,
                              "GET the API's stream path once a second: a 48-byte status record; "
                              "motion while bit 1 of byte 34 is set"),
-      Row<SanyoEID, Cam, Api, Inputs>("SanyoEID", "Sanyo", K::kInputLevel,
+      Row<SanyoEID, Cam, Api, InputCount>("SanyoEID", "Sanyo", K::kInputLevel,
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),
@@ -209,7 +214,7 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<YCAMMD, Cam>("YCAMMD", "Y-cam", K::kMotion,
                        "GET /stream.arm once per interval: 8 bytes, four area levels and their "
                        "flags; level the largest up to the first flagged area"),
-      Row<ZavioEID, Cam, Inputs>("ZavioEID", "Zavio", K::kInput,
+      Row<ZavioEID, Cam, InputCount>("ZavioEID", "Zavio", K::kInput,
                                  "GET /cgi-bin/admin/input?checkactive=N once a second for N = "
                                  "1..inputs, up to the first line inputN=active"),
       Row<ZavioMD, Cam, Api>("ZavioMD", "Zavio", K::kMotion,

@@ -59,6 +59,7 @@ struct DetectorClass {
   unsigned fields;          // ConfigField bits of the constructor's arguments
   std::string how;          // how the camera is asked, in one line
   std::function<std::unique_ptr<EventDetector>(const DetectorArgs&)> make;
+  bool counts_inputs = false;  // `inputs` is how many inputs it watches (0 or below: none)
 
   bool Takes(ConfigField field) const { return (fields & field) != 0; }
 };

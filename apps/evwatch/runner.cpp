@@ -1,5 +1,6 @@
 #include "apps/evwatch/runner.h"
 
+#include <atomic>
 #include <chrono>
 #include <functional>
 #include <system_error>
@@ -9,6 +10,7 @@
 #include "apps/evwatch/registry.h"
 #include "framework/host/camera.h"
 #include "framework/host/cameraapi.h"
+#include "framework/host/delaytimer.h"
 #include "framework/host/eventbuf.h"
 #include "framework/host/streambuffer.h"
 
@@ -158,7 +160,19 @@ void Runner::Stop() {
   for (auto& camera : cameras_) {
     if (camera->receiver) run([r = camera->receiver.get()] { r->Stop(); });
   }
+  // A detector sees its cleared run flag at the top of its next pass; wake the pacing timers
+  // until every stop has returned, so that none waits out a long interval first (a timer
+  // asleep before its flag was cleared would sleep on).
+  std::atomic<bool> stopped{false};
+  std::thread waker([&stopped] {
+    while (!stopped) {
+      DelayTimer::WakeAll();
+      std::this_thread::sleep_for(std::chrono::milliseconds(20));
+    }
+  });
   for (std::thread& t : stoppers) t.join();
+  stopped = true;
+  waker.join();
   detectors_.clear();
   cameras_.clear();
 }

@@ -36,6 +36,10 @@ class Runner {
 
   size_t DetectorCount() const { return detectors_.size(); }
 
+  // The longest a Stop() waits: the longest network time-out of a detector's request (the
+  // pacing timers are woken).
+  static constexpr int kLongestStopSeconds = 30;
+
  private:
   struct CameraUnit;
   struct DetectorUnit;

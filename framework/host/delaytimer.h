@@ -4,6 +4,11 @@
 //
 // A timer belongs to one thread. The clock can be replaced (tests count cycles against a
 // fake clock instead of measuring wall time).
+//
+// Shutting down: a host that clears detectors' run flags calls WakeAll() (from any thread),
+// so that every timer sleeping on the system clock returns at once instead of waiting out a
+// long interval; each loop then sees its run flag at the top of its next pass. A timer woken
+// while its detector keeps running starts its next period there, as after an overrun.
 
 #ifndef EVWATCH_FRAMEWORK_HOST_DELAYTIMER_H_
 #define EVWATCH_FRAMEWORK_HOST_DELAYTIMER_H_
@@ -38,6 +43,9 @@ class DelayTimer {
 
   // The default clock (steady_clock and a real sleep).
   static Clock* SystemClock();
+
+  // Ends the sleep of every timer on the system clock that is in Delay() now.
+  static void WakeAll();
 
  private:
   std::chrono::microseconds period_;

@@ -146,6 +146,21 @@ std::map<std::string, std::string> Camsim::Detectors() const {
   return out;
 }
 
+std::string Camsim::Rewrite(const TempDir& dir, const std::string& name,
+                            const std::function<bool(nlohmann::json& entry)>& change) const {
+  std::ifstream in(config_path_);
+  nlohmann::json config = nlohmann::json::parse(in, nullptr, false);
+  if (!config.is_object()) return "";
+  for (auto& camera : config["cameras"]) {
+    nlohmann::json kept = nlohmann::json::array();
+    for (auto& d : camera["detectors"]) {
+      if (change(d)) kept.push_back(d);
+    }
+    camera["detectors"] = kept;
+  }
+  return dir.Write(name, config.dump(2));
+}
+
 bool Camsim::Set(const std::string& camera, const std::string& query) const {
   return HttpGet(control_port_, "/cameras/" + camera + "/set?" + query).has_value();
 }

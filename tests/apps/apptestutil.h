@@ -6,6 +6,7 @@
 #ifndef EVWATCH_TESTS_APPS_APPTESTUTIL_H_
 #define EVWATCH_TESTS_APPS_APPTESTUTIL_H_
 
+#include <functional>
 #include <map>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -77,6 +78,10 @@ class Camsim {
   const std::string& ConfigPath() const { return config_path_; }
   // The `detectors` entries of the configuration it wrote: "camera/detector" -> class.
   std::map<std::string, std::string> Detectors() const;
+  // The configuration it wrote, rewritten into `dir` as `name`: change(entry) may edit each
+  // detector entry, and drops it by returning false. Gives the new file's path.
+  std::string Rewrite(const TempDir& dir, const std::string& name,
+                      const std::function<bool(nlohmann::json& entry)>& change) const;
   // /cameras/NAME/set?QUERY; true when the control API accepted it.
   bool Set(const std::string& camera, const std::string& query) const;
   // The camera's state as the control API gives it.

@@ -119,6 +119,12 @@ bool ChildProcess::WaitForOut(const std::function<bool(const std::vector<std::st
   return changed_.wait_for(lock, deadline, [&] { return pred(out_); });
 }
 
+bool ChildProcess::WaitForErr(const std::function<bool(const std::vector<std::string>&)>& pred,
+                              std::chrono::milliseconds deadline) {
+  std::unique_lock<std::mutex> lock(mutex_);
+  return changed_.wait_for(lock, deadline, [&] { return pred(err_); });
+}
+
 Completed RunToEnd(const std::vector<std::string>& argv, std::chrono::milliseconds deadline) {
   ChildProcess child(argv);
   Completed done;

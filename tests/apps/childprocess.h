@@ -41,6 +41,9 @@ class ChildProcess {
   // deadline passes first.
   bool WaitForOut(const std::function<bool(const std::vector<std::string>&)>& pred,
                   std::chrono::milliseconds deadline);
+  // The same for standard error.
+  bool WaitForErr(const std::function<bool(const std::vector<std::string>&)>& pred,
+                  std::chrono::milliseconds deadline);
 
  private:
   void Read(int fd, std::vector<std::string>* lines);

@@ -114,6 +114,50 @@ cameras:
   EXPECT_EQ(c.cameras[1].detectors[0].inputs, 1);
 }
 
+TEST(ConfigTest, EveryIntTheConstructorTakesIsPassedOn) {
+  Config c = ParseOk(R"(
+cameras:
+  - name: door
+    host: h
+    detectors:
+      - {class: ZavioEID, inputs: -1}
+      - {class: CanonEID, inputs: -7}
+      - {class: VivotekJpgMD, function_group: 5}
+      - {class: PanaJpgED, type: 7, function_group: 2}
+      - {class: DLINKEID, inputs: 2147483647}
+)");
+  ASSERT_EQ(c.cameras.size(), 1u);
+  const std::vector<DetectorConfig>& d = c.cameras[0].detectors;
+  ASSERT_EQ(d.size(), 5u);
+  EXPECT_EQ(d[0].inputs, -1);
+  EXPECT_EQ(d[1].inputs, -7);
+  EXPECT_EQ(d[2].function_group, 5);
+  EXPECT_EQ(d[3].type, 7);
+  EXPECT_EQ(d[3].function_group, 2);
+  EXPECT_EQ(d[4].inputs, 2147483647);
+}
+
+TEST(ConfigTest, ACountOfNoInputsIsAWarningNotAnError) {
+  Config c = ParseOk(R"(
+cameras:
+  - name: door
+    host: h
+    detectors:
+      - {class: ZavioEID, inputs: -1}
+      - {class: ACTiEID, inputs: 0}
+      - {class: CanonEID, inputs: -1}
+      - {class: AXISEID, inputs: 1}
+)");
+  // CanonEID's int is not a count (any input line counts): no warning for it.
+  ASSERT_EQ(c.warnings.size(), 2u);
+  EXPECT_EQ(c.warnings[0],
+            "ok.yaml:6: cameras[0].detectors[0].inputs: warning: -1: ZavioEID watches no input with a count "
+            "of 0 or below and will never report one active (it runs all the same)");
+  EXPECT_NE(c.warnings[1].find("ok.yaml:7: cameras[0].detectors[1].inputs: warning: 0: ACTiEID watches no input"),
+            std::string::npos)
+      << c.warnings[1];
+}
+
 TEST(ConfigTest, JsonIsAccepted) {
   Config c = ParseOk(R"({"interval": 250, "cameras": [{"name": "x", "host": "127.0.0.1", "port": 9000,
       "detectors": [{"class": "CanonEID", "inputs": 3}]}]})");
@@ -214,8 +258,6 @@ std::vector<BadCase> BadCases() {
        "did you mean \"CanonEID\"?"},
       {"FieldTheClassDoesNotTake", Cam("", "[{class: CanonMD, inputs: 2}]"), "cameras[0].detectors[0].inputs",
        "CanonMD takes no inputs (its constructor is CanonMD(Camera*))"},
-      {"InputsNegative", Cam("", "[{class: CanonEID, inputs: -1}]"), "cameras[0].detectors[0].inputs",
-       "-1 is outside"},
       {"MdParamsShort", Cam("api: {md_params: [1, 2, 3]}"), "cameras[0].api.md_params",
        "expected a list of 4 integers"},
       {"StreamKeyMalformed", Cam("api: {streams: {\"1-2\": {path: /x}}}"), "cameras[0].api.streams[\"1-2\"]",

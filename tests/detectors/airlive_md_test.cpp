@@ -1,83 +1,31 @@
 // AirliveV1MD against a fake camera that pushes motion data at motion/motiondata.cgi on the
-// camera's own port, with numeric groups.
-
-#include <gtest/gtest.h>
-
-#include <string>
-#include <vector>
+// camera's own port, with numeric groups: the shared cases, then AirLive's own line format.
 
 #include "detectors/airlive.h"
-#include "framework/host/camera.h"
-#include "framework/host/eventbuf.h"
-#include "tests/support/eventrecorder.h"
-#include "tests/support/fakecamera.h"
-#include "tests/support/streampush.h"
 
-namespace {
+#include "tests/detectors/fixedmotiondata_cases.h"
 
-using evtest::EventRecorder;
-using evtest::FakeCamera;
-using evtest::MotionReading;
-using evtest::Push;
-using evtest::PushHandler;
-using evtest::ReadMotionParts;
-using evtest::Report;
+namespace evtest {
 
-const char kPath[] = "/motion/motiondata.cgi";
-
-class AirliveV1MDTest : public ::testing::Test {
- protected:
-  MotionReading ReadOne(const std::string& body) {
-    AirliveV1MD detector(&camera_);
-    return ReadMotionParts(cam_, kPath, detector, {body})[0];
+struct AirliveStream {
+  using Detector = AirliveV1MD;
+  static constexpr const char* kPath = "/motion/motiondata.cgi";
+  static std::string Line(int group, int level, int threshold) {
+    return "group=" + std::to_string(group) + ";level=" + std::to_string(level) +
+           ";threshold=" + std::to_string(threshold) + ";";
   }
-
-  FakeCamera cam_;
-  Camera camera_{cam_.Record()};
 };
 
-TEST_F(AirliveV1MDTest, NumericGroupsAreRead) {
+INSTANTIATE_TYPED_TEST_SUITE_P(Airlive, FixedMotionDataTest, AirliveStream);
+
+using AirliveV1MDTest = FixedMotionDataTest<AirliveStream>;
+
+TEST_F(AirliveV1MDTest, NumericGroupsOfSeveralDigitsAreRead) {
   EXPECT_EQ(ReadOne("group=12;level=11;threshold=10;"), (MotionReading{0, true, 11}));
-  EXPECT_EQ(ReadOne("group=1;level=10;threshold=10;"), (MotionReading{0, false, 10}));
-  EXPECT_EQ(ReadOne("group=1;level=-1;threshold=10;"), (MotionReading{0, true, 4294967295u}));
 }
 
 TEST_F(AirliveV1MDTest, LetterGroupDoesNotMatch) {
   EXPECT_EQ(ReadOne("group=a;level=60;threshold=50;"), (MotionReading{0, false, 0}));
 }
 
-TEST_F(AirliveV1MDTest, WithoutMotionTheLastLinesLevelIsReported) {
-  EXPECT_EQ(ReadOne("group=0;level=30;threshold=50;\r\ngroup=1;level=5;threshold=50;\r\n"),
-            (MotionReading{0, false, 5}));
-}
-
-TEST_F(AirliveV1MDTest, LoopReadsTheFixedPathOnTheCamerasPort) {
-  cam_.Handle(kPath,
-              PushHandler({Push{{"group=0;level=60;threshold=50;", "group=0;level=5;threshold=50;"},
-                                Push::kRepeatLast,
-                                std::chrono::milliseconds(5)}}));
-  EventBuf buffer;
-  EventRecorder recorder(buffer);
-  AirliveV1MD detector(&camera_);
-  ASSERT_EQ(detector.Init(&buffer, 500), 0);
-  ASSERT_EQ(detector.Start(), 0);
-  ASSERT_TRUE(recorder.WaitForCount(3));
-  ASSERT_EQ(detector.Stop(), 0);
-  std::vector<Report> reports = recorder.Reports();
-  EXPECT_EQ(reports[0], (Report{true, 60}));
-  EXPECT_EQ(reports[1], (Report{false, 5}));
-  EXPECT_EQ(reports.back(), (Report{false, 0}));
-  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>{kPath}));
-}
-
-TEST_F(AirliveV1MDTest, WithoutCameraTheLoopEndsAtOnceReportingNothing) {
-  EventBuf buffer;
-  EventRecorder recorder(buffer);
-  AirliveV1MD detector(nullptr);
-  ASSERT_EQ(detector.Init(&buffer, 500), 0);
-  ASSERT_EQ(detector.Start(), 0);
-  ASSERT_EQ(detector.Stop(), 0);
-  EXPECT_EQ(recorder.Size(), 0u);
-}
-
-}  // namespace
+}  // namespace evtest

@@ -2,6 +2,9 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
+#include <future>
+#include <thread>
 #include <vector>
 
 namespace {
@@ -81,6 +84,23 @@ TEST(DelayTimerTest, SystemClockSleepsAtLeastThePeriod) {
   for (int i = 0; i < 3; ++i) timer.Delay();
   // sleep_until never wakes early, so three periods have passed (a lower bound only).
   EXPECT_GE(std::chrono::steady_clock::now() - start, microseconds(6000));
+}
+
+TEST(DelayTimerTest, WakeAllEndsAMinuteLongSleep) {
+  std::atomic<bool> sleeping{false};
+  std::future<void> done = std::async(std::launch::async, [&sleeping] {
+    DelayTimer timer(60 * 1000 * 1000);
+    timer.BeginTiming();
+    sleeping = true;
+    timer.Delay();
+  });
+  // WakeAll reaches only a timer that is asleep already: wake until this one has returned.
+  // The bound is far below the minute the timer would otherwise sleep.
+  const auto give_up = std::chrono::steady_clock::now() + std::chrono::seconds(30);
+  while (done.wait_for(std::chrono::milliseconds(10)) != std::future_status::ready) {
+    if (sleeping) DelayTimer::WakeAll();
+    ASSERT_LT(std::chrono::steady_clock::now(), give_up) << "the timer slept on after WakeAll";
+  }
 }
 
 }  // namespace
