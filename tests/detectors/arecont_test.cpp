@@ -66,6 +66,7 @@ TEST_F(ArecontTest, OtherValuesMeanMotion) {
     EXPECT_TRUE(r.state) << value;
     EXPECT_EQ(r.level, 100u) << value;
   }
+  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>(5, kMd)));
 }
 
 TEST_F(ArecontTest, EmptyValueMeansMotion) {
@@ -80,6 +81,7 @@ TEST_F(ArecontTest, EmptyValueMeansMotion) {
   EXPECT_EQ(r.result, 0);
   EXPECT_TRUE(r.state);
   EXPECT_EQ(r.level, 100u);
+  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>{kMd}));
 }
 
 TEST_F(ArecontTest, LastMdresultLineWins) {

@@ -74,6 +74,7 @@ TEST_F(MessoaProTest, OneMeansInputOnly) {
   Reading i = Input("Alarm.Status=1\n");
   EXPECT_EQ(i.result, 0);
   EXPECT_TRUE(i.state);
+  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>{kStatus, kStatus}));
 }
 
 TEST_F(MessoaProTest, TwoMeansMotionOnly) {
@@ -94,6 +95,7 @@ TEST_F(MessoaProTest, FourZeroAndNonNumbersMeanNeither) {
     EXPECT_EQ(i.result, 0) << value;
     EXPECT_FALSE(i.state) << value;
   }
+  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>(10, kStatus)));
 }
 
 TEST_F(MessoaProTest, KeyIsMatchedWholeAndWithItsCase) {
@@ -120,6 +122,7 @@ TEST_F(MessoaProTest, KeyBeyondTheFirst8192BytesIsNotFound) {
   Reading r = Motion(filler.substr(0, 8100) + "\nAlarm.Status=2\n" + filler);
   EXPECT_EQ(r.result, 0);
   EXPECT_TRUE(r.state);
+  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>(3, kStatus))) << "one request each";
 }
 
 TEST_F(MessoaProTest, FailedRequestsAndEmptyAnswersFail) {

@@ -84,6 +84,7 @@ TEST_F(MobotixTest, CounterWithoutSemicolonParsesWhole) {
   EXPECT_TRUE(Read(detector).state);
   EXPECT_FALSE(Read(detector).state) << "7 read twice";
   EXPECT_TRUE(Read(detector).state) << "70 is not 7";
+  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>(3, kMotion)));
 }
 
 TEST_F(MobotixTest, CounterIsFoundInsideTheLineAndCutAtTheFirstSemicolon) {

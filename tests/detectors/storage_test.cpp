@@ -97,6 +97,7 @@ TEST_F(StorageTest, KeyBeyondTheFirst8192BytesIsNotFound) {
   const std::string filler(8191, '#');
   EXPECT_EQ(Motion(filler + "\nalarm_status=1;\n").result, -1);
   EXPECT_EQ(Motion("alarm_status=1;\n" + filler).result, 0);
+  EXPECT_EQ(cam_.Targets(), (std::vector<std::string>{kStatus, kStatus}));
 }
 
 TEST_F(StorageTest, LoopsReportTheSwappedBits) {
