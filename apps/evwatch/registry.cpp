@@ -97,6 +97,7 @@ const char* KindName(DetectorKind kind) {
     case DetectorKind::kInput: return "input";
     case DetectorKind::kInputLevel: return "input (level)";
     case DetectorKind::kBoth: return "motion+input";
+    case DetectorKind::kBothLevel: return "motion+input (level)";
   }
   return "?";
 }
@@ -180,7 +181,7 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<MessoaProEID, Cam, Api, Inputs>("MessoaProEID", "MessoaPro", K::kInput,
                                           "GET the API's stream path and port once per interval; "
                                           "active while Alarm.Status is 1 or 3 (inputs unused)"),
-      Row<MobotixMD, Cam, DetType>("MobotixMD", "Mobotix", K::kBoth,
+      Row<MobotixMD, Cam, DetType>("MobotixMD", "Mobotix", K::kBothLevel,
                                    "GET /control/event.jpg?output=alarmupdate&filter=VM (type 0) "
                                    "or filter=SI (type 1) once per interval; an event while the "
                                    "first line's alarmcounter moved since the last reading"),
