@@ -5,6 +5,8 @@
 #ifndef EVWATCH_FRAMEWORK_POLLEDLOOP_H_
 #define EVWATCH_FRAMEWORK_POLLEDLOOP_H_
 
+#include <optional>
+
 #include "framework/detector.h"
 #include "framework/host/delaytimer.h"
 #include "framework/host/eventbuf.h"
@@ -29,18 +31,26 @@ inline PassReport InputReport(int result, bool state) {
   return result == 0 ? PassReport{state, 1} : PassReport{false, 0};
 }
 
+// The loop shape itself: while detector.IsStarted() yields 1, one pass(), its report when it
+// has one (a pass may return a PassReport or a std::optional<PassReport>; empty reports
+// nothing), then pace(); at the end (false, 0). A no-op pace() runs passes back to back.
+template <typename Pass, typename Pace>
+void RunPassLoop(DetectorBase& detector, EventBuf* buffer, Pass&& pass, Pace&& pace) {
+  while (detector.IsStarted() == 1) {
+    std::optional<PassReport> report = pass();
+    if (report) buffer->SetStatus(report->state, report->value);
+    pace();
+  }
+  buffer->SetStatus(false, 0);
+}
+
 // Runs pass() once per period (microseconds) while detector.IsStarted() yields 1, reporting
 // each PassReport it returns to buffer; then reports (false, 0).
 template <typename Pass>
 void RunPolledLoop(DetectorBase& detector, EventBuf* buffer, int period, Pass&& pass) {
   DelayTimer timer(period);
   timer.BeginTiming();
-  while (detector.IsStarted() == 1) {
-    PassReport report = pass();
-    buffer->SetStatus(report.state, report.value);
-    timer.Delay();
-  }
-  buffer->SetStatus(false, 0);
+  RunPassLoop(detector, buffer, pass, [&timer] { timer.Delay(); });
 }
 
 // RunPolledLoop with a motion pass: doMD(state, level) returns 0 for a reading.

@@ -8,8 +8,10 @@ namespace evsim {
 // One per maker, each in its own file.
 Emulation ActiEmulation();
 Emulation AirLiveEmulation();
+Emulation ArecontEmulation();
 Emulation AVIPCEmulation();
 Emulation AxisEmulation();
+Emulation BrickcomEmulation();
 Emulation CanonEmulation();
 Emulation ComproEmulation();
 Emulation DLinkEmulation();
@@ -19,10 +21,13 @@ Emulation IqeyeEmulation();
 Emulation JvcEmulation();
 Emulation LevelOneEmulation();
 Emulation MessoaEmulation();
+Emulation MessoaProEmulation();
+Emulation MobotixEmulation();
 Emulation PanasonicEmulation();
 Emulation PsiaEmulation();
 Emulation SanyoEmulation();
 Emulation SceneEmulation();
+Emulation StorageEmulation();
 Emulation VivotekEmulation();
 Emulation YcamEmulation();
 Emulation ZavioEmulation();
@@ -31,8 +36,10 @@ const std::vector<Emulation>& Emulations() {
   static const std::vector<Emulation> table = {
       ActiEmulation(),
       AirLiveEmulation(),
+      ArecontEmulation(),
       AVIPCEmulation(),
       AxisEmulation(),
+      BrickcomEmulation(),
       CanonEmulation(),
       ComproEmulation(),
       DLinkEmulation(),
@@ -42,10 +49,13 @@ const std::vector<Emulation>& Emulations() {
       JvcEmulation(),
       LevelOneEmulation(),
       MessoaEmulation(),
+      MessoaProEmulation(),
+      MobotixEmulation(),
       PanasonicEmulation(),
       PsiaEmulation(),
       SanyoEmulation(),
       SceneEmulation(),
+      StorageEmulation(),
       VivotekEmulation(),
       YcamEmulation(),
       ZavioEmulation(),

@@ -6,8 +6,10 @@
 
 #include "detectors/acti/actidetector.h"
 #include "detectors/airlive.h"
+#include "detectors/arecont.h"
 #include "detectors/avipc.h"
 #include "detectors/axis.h"
+#include "detectors/brickcom.h"
 #include "detectors/canon.h"
 #include "detectors/compro.h"
 #include "detectors/dlink.h"
@@ -19,8 +21,11 @@
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
 #include "detectors/messoa.h"
+#include "detectors/messoapro.h"
+#include "detectors/mobotix.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
+#include "detectors/storage.h"
 #include "detectors/vivotek.h"
 #include "detectors/ycam.h"
 #include "detectors/zavio.h"
@@ -96,6 +101,7 @@ const char* KindName(DetectorKind kind) {
     case DetectorKind::kInput: return "input";
     case DetectorKind::kInputLevel: return "input (level)";
     case DetectorKind::kBoth: return "motion+input";
+    case DetectorKind::kBothLevel: return "motion+input (level)";
   }
   return "?";
 }
@@ -120,6 +126,9 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                      "by the camera's id when not given), compared by the motion "
                                      "engine at the bound interval; level: % of the watched area "
                                      "that changed"),
+      Row<ARECONTMD, Cam, Api>("ARECONTMD", "Arecont", K::kMotion,
+                               "GET the API's stream path (on the camera's port) once a second; "
+                               "motion while the answer's mdresult does not contain \"no\""),
       Row<AVIPCEID, Cam, InputCount>("AVIPCEID", "AVIPC", K::kInput,
                                  "GET /cgi-bin/io/input.cgi?checkactive=N once a second for N = "
                                  "1..inputs, up to the first line inputN=active"),
@@ -132,6 +141,10 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<AxisMD, Cam, Api>("AxisMD", "Axis", K::kMotion,
                             "motion data pushed at the API's stream path; motion while a line "
                             "group=G;level=L;threshold=T; has L > T"),
+      Row<BrickcomEID, Cam, Api, InputCount>("BrickcomEID", "Brickcom", K::kInput,
+                                         "GET /cgi-bin/gpio.cgi?action=get on the camera's port for "
+                                         "di1.status, di2.status, ... up to the first that reads 0 "
+                                         "(active); passes back to back, no pacing timer"),
       Row<CanonMD, Cam>("CanonMD", "Canon", K::kMotion,
                         "GET /-wvhttp-01-/info.cgi once a second; motion while a line says m.1:=1"),
       Row<CanonEID, Cam, Inputs>("CanonEID", "Canon", K::kInput,
@@ -184,6 +197,16 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                   "GET /cgi-bin/admin/param.cgi?type=Get&group=AlarmStatus once "
                                   "per interval; active while Mode (after the [section] line) is "
                                   "1 or 3"),
+      Row<MessoaProMD, Cam, Api>("MessoaProMD", "MessoaPro", K::kMotion,
+                                 "GET the API's stream path and port once per interval; motion "
+                                 "while the answer's Alarm.Status is 2 or 3"),
+      Row<MessoaProEID, Cam, Api, Inputs>("MessoaProEID", "MessoaPro", K::kInput,
+                                          "GET the API's stream path and port once per interval; "
+                                          "active while Alarm.Status is 1 or 3 (inputs unused)"),
+      Row<MobotixMD, Cam, DetType>("MobotixMD", "Mobotix", K::kBothLevel,
+                                   "GET /control/event.jpg?output=alarmupdate&filter=VM (type 0) "
+                                   "or filter=SI (type 1) once per interval; an event while the "
+                                   "first line's alarmcounter moved since the last reading"),
       Row<PanaJpgED, Cam, Api, DetType, PanaGroup>(
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "
@@ -201,6 +224,12 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),
+      Row<StorageMD, Cam, Api>("StorageMD", "Storage", K::kMotion,
+                               "GET the API's stream path and port once per interval; motion "
+                               "while the answer's alarm_status (its first ';' dropped) is 1 or 3"),
+      Row<StorageEID, Cam, Api, Inputs>("StorageEID", "Storage", K::kInput,
+                                        "GET the API's stream path and port once per interval; "
+                                        "active while alarm_status is 2 or 3 (inputs unused)"),
       Row<VivotekEID, Cam, VivoGroup, Inputs>(
           "VivotekEID", "Vivotek", K::kInput,
           "GET /cgi-bin/getdi.cgi?diN for N = 1..inputs (function group 0, 1; line DIN=H) or "

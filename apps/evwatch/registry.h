@@ -25,8 +25,9 @@ class StreamBuffer;
 namespace evwatch {
 
 // kInputLevel: an input detector whose reading carries a level (100 while active) instead of
-// a validity flag.
-enum class DetectorKind { kMotion, kInput, kInputLevel, kBoth };
+// a validity flag. kBoth: motion or input by the entry's type (0: motion); kBothLevel: the
+// same, the input reading also carrying a level.
+enum class DetectorKind { kMotion, kInput, kInputLevel, kBoth, kBothLevel };
 
 // "motion", "input", "input (level)" or "motion+input".
 const char* KindName(DetectorKind kind);

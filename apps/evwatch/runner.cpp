@@ -112,6 +112,7 @@ bool Runner::StartDetectors(const CameraConfig& config, CameraUnit* camera, std:
 
     DetectorKind kind = info->kind;
     if (kind == DetectorKind::kBoth) kind = d.type == 0 ? DetectorKind::kMotion : DetectorKind::kInput;
+    if (kind == DetectorKind::kBothLevel) kind = d.type == 0 ? DetectorKind::kMotion : DetectorKind::kInputLevel;
     const int handle = sink_.Add(config.name, d.name, d.cls, kind);
 
     auto unit = std::make_unique<DetectorUnit>();

@@ -152,15 +152,15 @@ TEST(IntegrationTest, TextFormatIsOneReadableLinePerReport) {
   for (const auto& [key, cls] : detectors) {
     ASSERT_TRUE(seen.count(key)) << key;
     const evwatch::DetectorKind kind = evwatch::FindDetectorClass(cls)->kind;
-    const bool motion = kind == evwatch::DetectorKind::kMotion ||
-                        (kind == evwatch::DetectorKind::kBoth && types[key] == 0);
+    const bool both = kind == evwatch::DetectorKind::kBoth || kind == evwatch::DetectorKind::kBothLevel;
+    const bool motion = kind == evwatch::DetectorKind::kMotion || (both && types[key] == 0);
     // The software motion detector's first frame is its reference, no motion yet.
     const size_t reading = cls == "JpegDiffMD" ? 1 : 0;
     ASSERT_GT(seen[key].size(), reading + 1) << key;
     const TextLine& first = seen[key][reading];
     const TextLine& last = seen[key].back();
     EXPECT_EQ(first.words, motion ? "MOTION" : "ACTIVE") << key;
-    const bool level = motion || kind == evwatch::DetectorKind::kInputLevel;
+    const bool level = motion || kind == evwatch::DetectorKind::kInputLevel || kind == evwatch::DetectorKind::kBothLevel;
     EXPECT_EQ(first.label, level ? "level" : "valid") << key;
     EXPECT_GT(first.value, 0) << key;
     EXPECT_EQ(last.words, motion ? "no motion" : "idle") << key;
