@@ -5,6 +5,8 @@
 #ifndef EVWATCH_FRAMEWORK_POLLEDLOOP_H_
 #define EVWATCH_FRAMEWORK_POLLEDLOOP_H_
 
+#include <optional>
+
 #include "framework/detector.h"
 #include "framework/host/delaytimer.h"
 #include "framework/host/eventbuf.h"
@@ -30,14 +32,17 @@ inline PassReport InputReport(int result, bool state) {
 }
 
 // Runs pass() once per period (microseconds) while detector.IsStarted() yields 1, reporting
-// each PassReport it returns to buffer; then reports (false, 0).
+// each PassReport it returns to buffer; then reports (false, 0). A pass may return
+// std::optional<PassReport>: nullopt reports nothing and starts the next pass at once,
+// without waiting out the period.
 template <typename Pass>
 void RunPolledLoop(DetectorBase& detector, EventBuf* buffer, int period, Pass&& pass) {
   DelayTimer timer(period);
   timer.BeginTiming();
   while (detector.IsStarted() == 1) {
-    PassReport report = pass();
-    buffer->SetStatus(report.state, report.value);
+    std::optional<PassReport> report = pass();
+    if (!report) continue;
+    buffer->SetStatus(report->state, report->value);
     timer.Delay();
   }
   buffer->SetStatus(false, 0);

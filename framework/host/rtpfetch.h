@@ -19,8 +19,9 @@
 // try again. Packets on the RTCP channel and packets that are not RTP version 2 are passed
 // over; at most kMaxQueued received packets wait to be read, older ones are dropped.
 //
-// A reader belongs to one thread at a time; its calls block that thread for at most the
-// time-out (plus the set-up's requests, each bounded by it).
+// A reader belongs to one thread at a time. Its calls block that thread: each request (the
+// set-up's, a keep-alive, TEARDOWN at most 2 s) and each wait for a packet is bounded by the
+// time-out.
 
 #ifndef EVWATCH_FRAMEWORK_HOST_RTPFETCH_H_
 #define EVWATCH_FRAMEWORK_HOST_RTPFETCH_H_

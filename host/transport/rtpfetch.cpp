@@ -305,7 +305,7 @@ bool RtspSession::Request(long request, const std::string& uri, long timeout) {
     header_bytes_ = 0;
     if (curl_easy_setopt(easy_, CURLOPT_RTSP_REQUEST, request) != CURLE_OK ||
         curl_easy_setopt(easy_, CURLOPT_RTSP_STREAM_URI, uri.c_str()) != CURLE_OK ||
-        curl_easy_setopt(easy_, CURLOPT_TIMEOUT, timeout) != CURLE_OK) {
+        curl_easy_setopt(easy_, CURLOPT_TIMEOUT_MS, timeout * 1000) != CURLE_OK) {
       return false;
     }
     last_request_ = Clock::now();
@@ -328,10 +328,10 @@ bool RtspSession::Receive() {
     const Clock::time_point now = Clock::now();
     if (now >= deadline) return false;
     const long left = static_cast<long>(
-        std::chrono::duration_cast<std::chrono::seconds>(deadline - now).count());
+        std::chrono::duration_cast<std::chrono::milliseconds>(deadline - now).count());
     if (curl_easy_setopt(easy_, CURLOPT_RTSP_REQUEST, static_cast<long>(CURL_RTSPREQ_RECEIVE)) !=
             CURLE_OK ||
-        curl_easy_setopt(easy_, CURLOPT_TIMEOUT, std::max(1L, left)) != CURLE_OK ||
+        curl_easy_setopt(easy_, CURLOPT_TIMEOUT_MS, std::max(1L, left)) != CURLE_OK ||
         curl_easy_perform(easy_) != CURLE_OK) {
       return false;
     }
