@@ -6,11 +6,20 @@
 //   APP2: "VIVO" and the tag "jpeg", 11 bytes later a record count (1), then the record:
 //         a valid bit, a trigger bit and a 7-bit level (0..127), most significant bit first.
 // The frames have no JFIF header: its APP0 would come before the camera's own.
+//
+// The camera's MPEG-4 stream is served over RTSP on a port of its own (/live.sdp, RTP
+// interleaved over the RTSP connection, 25 packets a second): every RTP packet carries in its
+// header extension the same record after the tag "mp4v", one byte and a zero byte. The
+// camera has stream type 1 and video type 1; its API names the RTSP stream for (1, 1).
+// When the simulator asks for credentials, the RTSP server asks for them by Digest.
 
+#include <chrono>
+#include <optional>
 #include <string>
 #include <vector>
 
 #include "sim/emulation.h"
+#include "sim/net/rtspserver.h"
 #include "sim/scene/mjpeg.h"
 
 namespace evsim {
@@ -19,6 +28,10 @@ namespace {
 constexpr char kStreamPath[] = "/video.mjpg";
 constexpr int kFps = 10;
 constexpr int kBufferFps = 100;  // the receiver of the frame buffer reads at full speed
+constexpr char kRtspPath[] = "/live.sdp";
+constexpr int kVideoType = 1;
+constexpr int kRtpStreamType = 1;  // the stream whose packets carry the extension
+constexpr std::chrono::milliseconds kPacketPeriod{40};
 
 std::string App0Record(const CameraStatus& status) {
   std::string r(16, '\0');
@@ -31,9 +44,10 @@ std::string App0Record(const CameraStatus& status) {
   return r;
 }
 
-std::string App2Record(const CameraStatus& status) {
-  std::string r = "VIVOjpeg";
-  r += std::string(11, '\0');
+// The record after a tag: `lead` runs from the tag's start up to the record count (15
+// bytes), then the count (1) and the record: valid bit, trigger bit, 7-bit level.
+std::string TaggedRecord(const std::string& lead, const CameraStatus& status) {
+  std::string r = lead;
   r += '\x01';  // one record
   const int level = status.motion * 127 / 100;
   const bool trigger = status.motion > 0;
@@ -41,6 +55,14 @@ std::string App2Record(const CameraStatus& status) {
   record[0] = static_cast<char>(0x80 | (trigger ? 0x40 : 0) | (level >> 1));
   record[1] = static_cast<char>((level & 1) << 7);
   return r + record;
+}
+
+std::string App2Record(const CameraStatus& status) {
+  return "VIVO" + TaggedRecord("jpeg" + std::string(11, '\0'), status);
+}
+
+std::string Mp4Record(const CameraStatus& status) {
+  return TaggedRecord(std::string("mp4v") + 'V' + '\0' + std::string(9, '\0'), status);
 }
 
 void HandleVivotek(HttpConnection& connection, CameraState& state) {
@@ -52,6 +74,17 @@ void HandleVivotek(HttpConnection& connection, CameraState& state) {
   });
 }
 
+// One RTSP session whose packets follow the camera's motion; it ends when the camera falls
+// silent.
+void ServeRtsp(TcpConnection& connection, CameraState& state, const Login& login) {
+  RtspStream stream;
+  if (login.required) stream.auth = HttpAuth(AuthScheme::kDigest, login.user, login.password);
+  stream.period = kPacketPeriod;
+  stream.extension = [&state](uint64_t) { return std::optional<std::string>(Mp4Record(state.Get())); };
+  stream.ended = [&state] { return state.Get().silent; };
+  ServeRtspSession(connection, stream);
+}
+
 }  // namespace
 
 Emulation VivotekEmulation() {
@@ -60,8 +93,17 @@ Emulation VivotekEmulation() {
                              {
                                  {"VivotekJpgMD", "motion", {{"function_group", 0}}},
                                  {"VivotekJpgMD", "motion-app2", {{"function_group", 1}, {"stream_buffer", true}}},
+                                 {"VivotekMp4MD", "motion-rtp", {{"function_group", 0}}},
                              });
   e.api = StreamApi(kStreamPath);
+  e.tcp_service = ServeRtsp;
+  e.api_with_tcp_port = [](int port, int tcp_port) {
+    nlohmann::json api = StreamApi(kStreamPath)(port);
+    api["streams"][std::to_string(kVideoType) + ",1"] = {{"path", kRtspPath}, {"port", tcp_port}};
+    return api;
+  };
+  e.stream_type = kRtpStreamType;
+  e.video_type = kVideoType;
   e.frames = FramesAt(std::string(kStreamPath) + "?fps=" + std::to_string(kBufferFps));
   return e;
 }
