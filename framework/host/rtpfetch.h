@@ -7,17 +7,19 @@
 // firewalls and NAT like any TCP connection, loses no packet, and needs no UDP ports of our
 // own. The session is set up by the first NextHdrInfo (or ReadPartHeader): OPTIONS,
 // DESCRIBE, SETUP of the first video track of the description, PLAY. While packets are read,
-// a GET_PARAMETER keeps the session alive before the timeout that the camera announced in
-// its SETUP answer (60 s when it names none) runs out. Deleting the reader ends the session
-// with TEARDOWN, unless the connection has already failed. The user name and password answer
-// a Basic or Digest challenge; clientName is sent as the User-Agent of every request (cameras
-// log it, and some choose their stream by it).
+// a GET_PARAMETER (OPTIONS, once the camera has refused GET_PARAMETER) keeps the session
+// alive before the timeout that the camera announced in its SETUP answer (60 s when it names
+// none) runs out. Deleting the reader ends the session with TEARDOWN, unless the connection
+// has already failed. The user name and password answer a Basic or Digest challenge;
+// clientName is sent as the User-Agent of every request (cameras log it, and some choose
+// their stream by it).
 //
 // Failures: the session could not be set up, the camera closed the connection, no packet
 // came within the time-out, or it sent something that is not RTSP. Any of them ends the
 // session, and every later call fails: the owner deletes the reader and makes a new one to
-// try again. Packets on the RTCP channel and packets that are not RTP version 2 are passed
-// over; at most kMaxQueued received packets wait to be read, older ones are dropped.
+// try again. Packets on the RTCP channel, packets that are not RTP version 2 and packets
+// whose CSRC list, extension or padding do not fit them are passed over; at most kMaxQueued
+// received packets wait to be read, older ones are dropped.
 //
 // A reader belongs to one thread at a time. Its calls block that thread: each request (the
 // set-up's, a keep-alive, TEARDOWN at most 2 s) and each wait for a packet is bounded by the

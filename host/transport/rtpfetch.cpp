@@ -190,6 +190,8 @@ class RtspSession {
   std::string aggregate_;   // where PLAY, GET_PARAMETER and TEARDOWN go
   int channel_ = 0;         // interleaved channel of our track's RTP packets
   int keepalive_seconds_ = kDefaultSessionTimeout / 2;
+  bool options_keepalive_ = false;  // the camera refused GET_PARAMETER
+  long last_status_ = 0;            // of the last request's answer; 0: none came
   Clock::time_point last_request_;
   std::deque<std::string> queue_;  // received RTP packets of our channel, oldest first
   Packet current_;
@@ -309,9 +311,11 @@ bool RtspSession::Request(long request, const std::string& uri, long timeout) {
       return false;
     }
     last_request_ = Clock::now();
+    last_status_ = 0;
     if (curl_easy_perform(easy_) != CURLE_OK) return false;
     long status = 0;
     curl_easy_getinfo(easy_, CURLINFO_RESPONSE_CODE, &status);
+    last_status_ = status;
     if (status >= 200 && status <= 299) return true;
     if (status != 401 || user_.empty()) return false;
   }
@@ -341,7 +345,13 @@ bool RtspSession::Receive() {
 
 bool RtspSession::KeepAliveIfDue() {
   if (Clock::now() - last_request_ < std::chrono::seconds(keepalive_seconds_)) return true;
-  return Request(CURL_RTSPREQ_GET_PARAMETER, aggregate_, timeout_);
+  if (!options_keepalive_) {
+    if (Request(CURL_RTSPREQ_GET_PARAMETER, aggregate_, timeout_)) return true;
+    if (last_status_ == 0) return false;  // no answer: the connection is gone
+    // A camera without GET_PARAMETER counts any request in the session; OPTIONS it knows.
+    options_keepalive_ = true;
+  }
+  return Request(CURL_RTSPREQ_OPTIONS, aggregate_, timeout_);
 }
 
 int RtspSession::Next(unsigned int* ext_length, int* payload_length) {

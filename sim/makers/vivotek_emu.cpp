@@ -80,7 +80,9 @@ void ServeRtsp(TcpConnection& connection, CameraState& state, const Login& login
   RtspStream stream;
   if (login.required) stream.auth = HttpAuth(AuthScheme::kDigest, login.user, login.password);
   stream.period = kPacketPeriod;
-  stream.extension = [&state](uint64_t) { return std::optional<std::string>(Mp4Record(state.Get())); };
+  stream.extension = [&state](uint64_t) {
+    return std::optional<std::string>(Mp4Record(state.Get()));
+  };
   stream.ended = [&state] { return state.Get().silent; };
   ServeRtspSession(connection, stream);
 }

@@ -194,14 +194,14 @@ bool Session::Handle(const HttpRequest& request) {
   }
   if (method == "PLAY") {
     if (!set_up_ || !in_session) return Answer(request, 454);
-    if (!Answer(request, 200, "Session: " + std::string(kSessionId) + "\r\nRange: npt=0.000-\r\n")) {
-      return false;
-    }
+    const std::string headers = "Session: " + std::string(kSessionId) + "\r\nRange: npt=0.000-\r\n";
+    if (!Answer(request, 200, headers)) return false;
     if (!playing_) next_packet_ = Clock::now();
     playing_ = true;
     return true;
   }
   if (method == "GET_PARAMETER") {
+    if (!stream_.get_parameter) return Answer(request, 405);
     if (!in_session) return Answer(request, 454);
     return Answer(request, 200, "Session: " + std::string(kSessionId) + "\r\n");
   }
@@ -227,10 +227,14 @@ bool Session::Answer(const HttpRequest& request, int status, const std::string& 
 
 bool Session::SendPacket() {
   const uint32_t timestamp = static_cast<uint32_t>(sent_) * kTicksPerPacket;
-  std::optional<std::string> extension;
-  if (stream_.extension) extension = stream_.extension(sent_);
-  std::string out =
-      Interleaved(0, MakeRtpPacket(static_cast<uint16_t>(sent_), timestamp, extension));
+  std::optional<std::string> packet;
+  if (stream_.raw_packet) packet = stream_.raw_packet(sent_);
+  if (!packet) {
+    std::optional<std::string> extension;
+    if (stream_.extension) extension = stream_.extension(sent_);
+    packet = MakeRtpPacket(static_cast<uint16_t>(sent_), timestamp, extension);
+  }
+  std::string out = Interleaved(0, *packet);
   ++sent_;
   if (sent_ % kRtcpEvery == 0) {
     out += Interleaved(1, SenderReport(timestamp, static_cast<uint32_t>(sent_)));

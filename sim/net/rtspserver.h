@@ -40,6 +40,10 @@ struct RtspStream {
   // The header-extension data of packet n (from 0), padded by the server with zeros to a
   // multiple of four bytes; nullopt for a packet without extension. Unset: none has one.
   std::function<std::optional<std::string>(uint64_t n)> extension;
+  // Optional: the whole RTP packet n as the camera sends it, in place of the one made from
+  // `extension` (for malformed or unusual packets); nullopt: the made one.
+  std::function<std::optional<std::string>(uint64_t n)> raw_packet;
+  bool get_parameter = true;  // false: GET_PARAMETER is answered 405, as some cameras do
   long close_after = -1;   // packets sent before the camera closes the connection; -1: never
   long silent_after = -1;  // packets sent before the camera hangs (sends and answers nothing)
   std::function<bool()> ended;  // polled; true ends the session (the camera fell silent)

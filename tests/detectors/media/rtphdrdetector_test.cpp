@@ -127,7 +127,8 @@ class RtpHdrTest : public ::testing::Test {
 TEST_F(RtpHdrTest, ValidAndTriggerGiveMotionWithTheSevenBitLevel) {
   EXPECT_EQ(Judge(kMotion), (Reading{true, 0x0B}));
   Serve([](int) { return Always(kMotion); });
-  std::vector<Report> reports = RunUntil([](const std::vector<Report>& r) { return r.size() >= 3; });
+  std::vector<Report> reports =
+      RunUntil([](const std::vector<Report>& r) { return r.size() >= 3; });
   EXPECT_EQ(reports[0], (Report{true, 0x0B}));
   EXPECT_EQ(reports[1], (Report{true, 0x0B}));
   EXPECT_EQ(reports.back(), (Report{false, 0}));
@@ -157,7 +158,8 @@ TEST_F(RtpHdrTest, PacketWithoutExtensionIsNotReported) {
       return kValidNoTrigger;
     });
   });
-  std::vector<Report> reports = RunUntil([](const std::vector<Report>& r) { return r.size() >= 2; });
+  std::vector<Report> reports =
+      RunUntil([](const std::vector<Report>& r) { return r.size() >= 2; });
   // Had the empty packet's pass reported, its reading would stand between these two.
   EXPECT_EQ(reports[0], (Report{true, 0x0B}));
   EXPECT_EQ(reports[1], (Report{false, 0x0B}));

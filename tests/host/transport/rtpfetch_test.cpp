@@ -226,6 +226,90 @@ TEST(RtpFetchTest, KeepsTheSessionAliveBeforeItsTimeout) {
   EXPECT_EQ(cam.Connections(), 1);
 }
 
+TEST(RtpFetchTest, KeepsTheSessionAliveWithOptionsWhenGetParameterIsRefused) {
+  FakeRtspCamera cam([](int) {
+    RtspStream s;
+    s.session_timeout = 2;
+    s.get_parameter = false;
+    s.period = std::chrono::milliseconds(20);
+    s.extension = Numbered;
+    return s;
+  });
+  RtpFetch fetch("127.0.0.1", cam.Port(), kPath, "", "", kClient, 2);
+  for (int n = 0; n < 150; ++n) {
+    std::optional<std::string> ext = NextExt(fetch);
+    ASSERT_TRUE(ext.has_value()) << "packet " << n;
+    EXPECT_EQ(*ext, Padded("pkt" + std::to_string(n)));
+  }
+  // Asked once, refused, never asked again; OPTIONS in the session from then on.
+  EXPECT_EQ(cam.Count("GET_PARAMETER"), 1);
+  const std::vector<std::string> methods = cam.Methods();
+  ASSERT_GE(methods.size(), 6u);
+  EXPECT_EQ(methods[4], "GET_PARAMETER");
+  EXPECT_EQ(methods[5], "OPTIONS");
+  const std::string aggregate = "rtsp://127.0.0.1:" + std::to_string(cam.Port()) + kPath + "/";
+  const std::vector<evsim::HttpRequest> requests = cam.Requests();
+  for (size_t i = 5; i < requests.size(); ++i) {
+    EXPECT_EQ(requests[i].method, "OPTIONS");
+    EXPECT_EQ(requests[i].target, aggregate);
+  }
+  EXPECT_EQ(cam.Connections(), 1);
+}
+
+// An extension header of profile "VV" announcing one word of data.
+const std::string kOneWord("\x56\x56\x00\x01", 4);
+
+// RTP header fields in order: first byte, payload type, sequence, timestamp, SSRC.
+std::string RtpHead(unsigned char first, uint16_t sequence) {
+  std::string h;
+  h += static_cast<char>(first);
+  h += static_cast<char>(96);
+  h += static_cast<char>(sequence >> 8);
+  h += static_cast<char>(sequence & 0xff);
+  h += std::string(4, '\0');      // timestamp
+  h += std::string("\x12\x34\x56\x78", 4);  // SSRC
+  return h;
+}
+
+TEST(RtpFetchTest, ReadsCsrcListAndPaddingAndPassesOverPacketsThatAreNotRtp) {
+  FakeRtspCamera cam([](int) {
+    RtspStream s = Fast();
+    s.raw_packet = [](uint64_t n) -> std::optional<std::string> {
+      switch (n) {
+        case 0:  // two CSRCs, an extension of one word, payload "xyz", three bytes of padding
+          return RtpHead(0xB2, 0) + std::string(8, '\x01') + kOneWord + "abcd" + "xyz" +
+                 std::string("\0\0\x03", 3);
+        case 1:  // version 1
+          return std::string(1, '\x50') + RtpHead(0x90, 1).substr(1) + kOneWord + "efgh";
+        case 2:  // an extension longer than the packet
+          return RtpHead(0x90, 2) + std::string("\x56\x56\x00\x0a", 4) + "ijkl";
+        case 3:  // shorter than an RTP header
+          return std::string("\x90\x60\x00", 3);
+        case 4:  // padding longer than the packet
+          return RtpHead(0xA0, 4) + "pay" + std::string("\x20", 1);
+        default:
+          return std::nullopt;
+      }
+    };
+    return s;
+  });
+  RtpFetch fetch("127.0.0.1", cam.Port(), kPath, "", "", kClient);
+  int length = 0;
+  char header[128];
+  ASSERT_EQ(fetch.ReadPartHeader(&length, header, sizeof(header)), 0);
+  ASSERT_EQ(length, 3);
+  std::string payload(3, '\0');
+  ASSERT_EQ(fetch.ReadPartBody(&payload[0], 3), 0);
+  EXPECT_EQ(payload, "xyz");
+  unsigned char ext[4];
+  ASSERT_EQ(fetch.FetchExtData(ext, 4), 0);
+  EXPECT_EQ(std::string(reinterpret_cast<char*>(ext), 4), "abcd");
+  // Packets 1 to 4 are not RTP that can be read: the next one delivered is packet 5.
+  std::optional<std::string> next = NextExt(fetch);
+  ASSERT_TRUE(next.has_value());
+  EXPECT_EQ(*next, Padded("pkt5"));
+}
+
 TEST(RtpFetchTest, CameraThatClosesTheSessionFailsTheReader) {
   FakeRtspCamera cam([](int) {
     RtspStream s = Fast();
