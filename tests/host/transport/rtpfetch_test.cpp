@@ -203,15 +203,17 @@ TEST(RtpFetchTest, WrongPasswordFailsAndStaysFailed) {
 }
 
 TEST(RtpFetchTest, KeepsTheSessionAliveBeforeItsTimeout) {
-  // The camera ends a session that is silent for two seconds; packets come for three.
+  // The camera ends a session that is silent for two seconds; packets come for three. Every
+  // request needs Digest credentials, the keep-alives too.
   FakeRtspCamera cam([](int) {
     RtspStream s;
     s.session_timeout = 2;
     s.period = std::chrono::milliseconds(20);
     s.extension = Numbered;
+    s.auth = HttpAuth(AuthScheme::kDigest, "admin", "secret");
     return s;
   });
-  RtpFetch fetch("127.0.0.1", cam.Port(), kPath, "", "", kClient, 2);
+  RtpFetch fetch("127.0.0.1", cam.Port(), kPath, "admin", "secret", kClient, 2);
   for (int n = 0; n < 150; ++n) {
     std::optional<std::string> ext = NextExt(fetch);
     ASSERT_TRUE(ext.has_value()) << "packet " << n;
@@ -221,6 +223,7 @@ TEST(RtpFetchTest, KeepsTheSessionAliveBeforeItsTimeout) {
   for (const evsim::HttpRequest& r : cam.Requests()) {
     if (r.method != "GET_PARAMETER") continue;
     EXPECT_EQ(r.Header("Session"), "5A1B2C3D");
+    EXPECT_EQ(r.Header("Authorization").substr(0, 7), "Digest ");
     EXPECT_EQ(r.target, "rtsp://127.0.0.1:" + std::to_string(cam.Port()) + kPath + "/");
   }
   EXPECT_EQ(cam.Connections(), 1);
