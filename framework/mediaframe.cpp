@@ -1,11 +1,16 @@
 #include "framework/mediaframe.h"
 
+#include <chrono>
+#include <thread>
+
+#include "framework/detector.h"
 #include "framework/host/fetcher.h"
 #include "framework/host/streambuffer.h"
 
 namespace {
 
 const int kHeaderSize = 128;  // part-header scratch buffer handed to the fetcher
+const int kBackOffSeconds = 5;
 
 }  // namespace
 
@@ -29,4 +34,10 @@ int ReadFrameBody(FetcherBase* fetcher, char* buffer, int length) {
     return -1;
   }
   return fetcher->ReadPartBody(buffer, length) == 0 ? 0 : -1;
+}
+
+void BackOffMediaStream(DetectorBase& detector) {
+  for (int i = 0; i < kBackOffSeconds && detector.IsStarted() == 1; ++i) {
+    std::this_thread::sleep_for(std::chrono::seconds(1));
+  }
 }

@@ -1,12 +1,14 @@
 // Where the media-borne detectors get a frame: the payload of a frame-buffer unit, checked
-// against its slot, and the two reads of a frame from a part stream. Written once for every
-// detector that reads frames.
+// against its slot, the two reads of a frame from a part stream, and the pace and back-off of
+// the detectors that read media. Written once for every detector that reads frames.
 //
 // Threads: the functions keep no state; the buffer, unit and fetcher belong to the caller.
+// BackOffMediaStream runs on the detector's worker thread.
 
 #ifndef EVWATCH_FRAMEWORK_MEDIAFRAME_H_
 #define EVWATCH_FRAMEWORK_MEDIAFRAME_H_
 
+class DetectorBase;
 class FetcherBase;
 class StreamBuffer;
 struct DataUnit;
@@ -22,5 +24,13 @@ int ReadFrameLength(FetcherBase* fetcher, int* length);
 // Reads `length` body bytes into buffer: 0, or -1 when the read fails. With no buffer or a
 // length below 1 the body is skipped and the result is -1; a null fetcher gives -1.
 int ReadFrameBody(FetcherBase* fetcher, char* buffer, int length);
+
+// The pace of the detectors that read a camera's media, in microseconds: frame pace, not
+// the one-second pace of the polled detectors.
+inline constexpr int kMediaPeriod = 16000;
+
+// Gives a camera that refused or dropped its stream time before the next attempt: up to
+// five one-second sleeps, ending early once the detector is stopped.
+void BackOffMediaStream(DetectorBase& detector);
 
 #endif  // EVWATCH_FRAMEWORK_MEDIAFRAME_H_

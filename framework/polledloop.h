@@ -45,7 +45,9 @@ void RunPassLoop(DetectorBase& detector, EventBuf* buffer, Pass&& pass, Pace&& p
 }
 
 // Runs pass() once per period (microseconds) while detector.IsStarted() yields 1, reporting
-// each PassReport it returns to buffer; then reports (false, 0).
+// each PassReport it returns to buffer; then reports (false, 0). A pass may return
+// std::optional<PassReport>: nullopt reports nothing, and the period is kept all the same (a
+// pass that slept longer than the period starts the next one at once).
 template <typename Pass>
 void RunPolledLoop(DetectorBase& detector, EventBuf* buffer, int period, Pass&& pass) {
   DelayTimer timer(period);

@@ -12,6 +12,7 @@
 #define EVWATCH_SIM_EMULATION_H_
 
 #include <functional>
+#include <optional>
 #include <nlohmann/json.hpp>
 #include <string>
 #include <string_view>
@@ -63,6 +64,14 @@ struct Emulation {
   // Optional, for a camera with a TCP service: answers an HTTP request in place of `handle`,
   // knowing the service's port (the camera's CGIs tell clients where it listens).
   std::function<void(HttpConnection&, CameraState&, int tcp_port)> handle_with_tcp_port;
+  // Optional, for a camera with a TCP service that the camera API names (an RTSP server):
+  // the camera's `api:` block for a camera whose HTTP server listens on `port` and whose TCP
+  // service listens on `tcp_port`; used in place of `api`.
+  std::function<nlohmann::json(int port, int tcp_port)> api_with_tcp_port;
+  // Optional: the camera's stream type and video type (Camera::GetStmType, GetVideoType),
+  // for detectors that choose their stream by them.
+  std::optional<int> stream_type;
+  std::optional<int> video_type;
 };
 
 // An emulation whose classes are those of its detector entries, in the order they first come.

@@ -18,7 +18,13 @@ std::vector<evwatch::WatchedCamera> SimWatch(const std::vector<SimCamera>& camer
     c.port = camera.port;
     c.user = options.user;
     c.password = options.password;
-    if (camera.emulation->api) c.api = camera.emulation->api(camera.port);
+    if (camera.emulation->api_with_tcp_port) {
+      c.api = camera.emulation->api_with_tcp_port(camera.port, camera.tcp_port);
+    } else if (camera.emulation->api) {
+      c.api = camera.emulation->api(camera.port);
+    }
+    c.stream_type = camera.emulation->stream_type;
+    c.video_type = camera.emulation->video_type;
     if (camera.emulation->frames) {
       // The frame buffer's shared-memory key follows the camera id: the port, unique among
       // the simulators running on this host, keeps two evwatch runs from sharing a key.

@@ -20,6 +20,8 @@ nlohmann::ordered_json CameraEntry(const WatchedCamera& c) {
   }
   if (!c.api.is_null()) entry[field::kApi] = c.api;
   if (c.id) entry[field::kId] = *c.id;
+  if (c.stream_type) entry[field::kStreamType] = *c.stream_type;
+  if (c.video_type) entry[field::kVideoType] = *c.video_type;
   if (!c.frames.is_null()) entry[field::kFrames] = c.frames;
   nlohmann::ordered_json detectors = nlohmann::ordered_json::array();
   for (const WatchedDetector& d : c.detectors) detectors.push_back(DetectorEntry(d));

@@ -25,6 +25,8 @@ inline constexpr char kPort[] = "port";
 inline constexpr char kUser[] = "user";
 inline constexpr char kPassword[] = "password";
 inline constexpr char kId[] = "id";
+inline constexpr char kStreamType[] = "stream_type";
+inline constexpr char kVideoType[] = "video_type";
 inline constexpr char kApi[] = "api";
 inline constexpr char kFrames[] = "frames";
 inline constexpr char kDetectors[] = "detectors";
@@ -47,6 +49,8 @@ struct WatchedCamera {
   std::string user;      // empty: the camera asks for no credentials
   std::string password;
   std::optional<int> id;
+  std::optional<int> stream_type;  // absent: the camera's default (0)
+  std::optional<int> video_type;
   nlohmann::ordered_json api;
   nlohmann::ordered_json frames;
   std::vector<WatchedDetector> detectors;

@@ -20,6 +20,7 @@
 #include "detectors/levelone.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
+#include "detectors/media/rtphdrdetector.h"
 #include "detectors/messoa.h"
 #include "detectors/messoapro.h"
 #include "detectors/mobotix.h"
@@ -239,6 +240,10 @@ const std::vector<DetectorClass>& DetectorClasses() {
           "VivotekJpgMD", "Vivotek", K::kMotion,
           "JPEG frames of the API's stream (1, 2) or the frame buffer; motion flag and level in "
           "the APP0 record (function group 0) or the APP2 record after \"jpeg\" (other groups)"),
+      Row<VivotekMp4MD, Cam, Api, VivoGroup>(
+          "VivotekMp4MD", "Vivotek", K::kMotion,
+          "RTP header extensions of the API's stream (video type, 1) over RTSP, for a camera of "
+          "stream type 1; motion flag and 7-bit level in the record after \"mp4v\""),
       Row<YCAMMD, Cam>("YCAMMD", "Y-cam", K::kMotion,
                        "GET /stream.arm once per interval: 8 bytes, four area levels and their "
                        "flags; level the largest up to the first flagged area"),

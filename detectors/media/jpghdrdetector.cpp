@@ -2,14 +2,13 @@
 
 #include <syslog.h>
 
-#include <chrono>
 #include <csetjmp>
 #include <cstring>
 #include <memory>
 #include <new>
 #include <string>
-#include <thread>
 
+#include "detectors/media/vivotekrecord.h"
 #include "framework/host/camera.h"
 #include "framework/host/cameraapi.h"
 #include "framework/host/fetcher.h"
@@ -27,8 +26,6 @@ namespace {
 
 const char kSourceName[] = "jpghdrdetector";
 const char kLoopName[] = "EventDetecor";
-const int kPeriod = 16000;  // frame pace, in microseconds
-const int kBackOffSeconds = 5;
 const unsigned int kMaxSavedSegment = 65535;
 const int kMarkerCom = 0xFE;
 const int kMarkerApp0 = 0xE0;
@@ -67,14 +64,6 @@ char* NextStreamFrame(JpgHdrDetector& detector, const Camera& camera, CameraAPI*
   return nullptr;
 }
 
-// Gives a camera that refused or dropped its stream time before the next attempt, in
-// one-second steps so that a Stop ends the wait early.
-void BackOff(JpgHdrDetector& detector) {
-  for (int i = 0; i < kBackOffSeconds && detector.IsStarted() == 1; ++i) {
-    std::this_thread::sleep_for(std::chrono::seconds(1));
-  }
-}
-
 }  // namespace
 
 JpgHdrDetector::JpgHdrDetector(Camera* camera, StreamBuffer* buffer, CameraAPI* api,
@@ -95,7 +84,7 @@ int JpgHdrDetector::EventDetecor() {
 
   DataUnit* previous = nullptr;
   StreamState stream;
-  RunPolledLoop(*this, event_buffer_, kPeriod, [&]() -> PassReport {
+  RunPolledLoop(*this, event_buffer_, kMediaPeriod, [&]() -> PassReport {
     unsigned int level = 0;
     bool state = false;
     int length = 0;
@@ -112,7 +101,7 @@ int JpgHdrDetector::EventDetecor() {
       if (frame != nullptr && length > 0) {
         state = DoED(frame, length, level);
       } else {
-        BackOff(*this);
+        BackOffMediaStream(*this);
       }
     }
     return PassReport{state, static_cast<int>(level)};
@@ -203,31 +192,7 @@ bool VivotekJpgMD::IsEventDetected(char* data, unsigned int length, unsigned int
     level = nibble * 6 + 6;
     return true;
   }
-
-  static const unsigned char kTag[4] = {'j', 'p', 'e', 'g'};
-  if (length < 5) return false;
-  unsigned int at = 0;
-  bool found = false;
-  for (; at <= length - 5; ++at) {
-    if (memcmp(bytes + at, kTag, sizeof(kTag)) == 0) {
-      found = true;
-      break;
-    }
-  }
-  if (!found) return false;
-  const unsigned int count_at = at + 15;
-  const unsigned int bits_at = count_at + 1;
-  if (bits_at >= length) return false;
-  // Bits 0 (valid) and 1 (trigger) lie in the first byte of the record, which exists only
-  // when the count gives the record any bytes.
-  if (bytes[count_at] == 0) return false;
-  const unsigned char first = bytes[bits_at];
-  if ((first & 0x80) == 0) return false;
-  // The level's last bit is the first bit of the next byte, read as 0 when the segment
-  // ends before it.
-  const unsigned char next = bits_at + 1 < length ? bytes[bits_at + 1] : 0;
-  level = ((first << 1) & 0x7E) | (next >> 7);
-  return (first & 0x40) != 0;
+  return ReadVivotekRecord(bytes, length, "jpeg", false, level);
 }
 
 JVCJpgMD::JVCJpgMD(Camera* camera, StreamBuffer* buffer, CameraAPI* api)

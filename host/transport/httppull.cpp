@@ -29,13 +29,6 @@ constexpr size_t kMaxHeaderBytes = 256 * 1024;
 // least half of it, so that each byte moves at most a few times.
 constexpr size_t kCompactAfter = 16 * 1024;
 
-// curl_global_init is not safe to race with other curl calls; a function-local static runs
-// it once, before the first transfer of any thread.
-bool CurlReady() {
-  static const bool ready = curl_global_init(CURL_GLOBAL_DEFAULT) == CURLE_OK;
-  return ready;
-}
-
 // "HTTP/1.1 200 OK" -> 200; 0 when the line holds no three-digit code.
 int ParseStatus(std::string_view line) {
   size_t space = line.find(' ');
@@ -48,17 +41,6 @@ int ParseStatus(std::string_view line) {
     status = status * 10 + (c - '0');
   }
   return status;
-}
-
-// libcurl wants IPv6 literals in brackets, with a zone id escaped as "%25".
-std::string UrlHost(const std::string& host) {
-  if (host.empty() || host.front() == '[' || host.find(':') == std::string::npos) return host;
-  std::string bracketed = "[";
-  for (size_t i = 0; i < host.size(); ++i) {
-    bracketed += host[i];
-    if (host[i] == '%' && host.compare(i + 1, 2, "25") != 0) bracketed += "25";
-  }
-  return bracketed + "]";
 }
 
 bool BuildUrl(CURLU* url, const HttpPull::Target& target) {
@@ -84,6 +66,23 @@ bool BuildUrl(CURLU* url, const HttpPull::Target& target) {
 }
 
 }  // namespace
+
+// curl_global_init is not safe to race with other curl calls; a function-local static runs
+// it once, before the first transfer of any thread.
+bool CurlReady() {
+  static const bool ready = curl_global_init(CURL_GLOBAL_DEFAULT) == CURLE_OK;
+  return ready;
+}
+
+std::string UrlHost(const std::string& host) {
+  if (host.empty() || host.front() == '[' || host.find(':') == std::string::npos) return host;
+  std::string bracketed = "[";
+  for (size_t i = 0; i < host.size(); ++i) {
+    bracketed += host[i];
+    if (host[i] == '%' && host.compare(i + 1, 2, "25") != 0) bracketed += "25";
+  }
+  return bracketed + "]";
+}
 
 HttpPull::HttpPull(Target target) : target_(std::move(target)) {}
 

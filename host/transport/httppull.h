@@ -21,6 +21,14 @@
 #include <utility>
 #include <vector>
 
+// Initialises libcurl once for the process, before the first transfer of any thread; every
+// user of libcurl in the host calls it first. False when libcurl cannot be used.
+bool CurlReady();
+
+// host as libcurl wants it in a URL: an IPv6 literal in brackets, its zone id escaped as
+// "%25"; names and IPv4 addresses unchanged.
+std::string UrlHost(const std::string& host);
+
 class HttpPull {
  public:
   struct Target {

@@ -173,6 +173,10 @@ bool HttpAuth::Accepts(const HttpRequest& request) const {
 }
 
 std::string HttpAuth::Challenge() const {
+  return MakeResponse(401, "text/plain", "401 Unauthorized\n", {ChallengeHeader()});
+}
+
+std::string HttpAuth::ChallengeHeader() const {
   std::string challenge;
   if (scheme_ == AuthScheme::kDigest) {
     challenge = "WWW-Authenticate: Digest realm=" + Quote(realm_) + ", qop=\"auth\", nonce=\"" +
@@ -180,7 +184,7 @@ std::string HttpAuth::Challenge() const {
   } else {
     challenge = "WWW-Authenticate: Basic realm=" + Quote(realm_);
   }
-  return MakeResponse(401, "text/plain", "401 Unauthorized\n", {challenge});
+  return challenge;
 }
 
 }  // namespace evsim

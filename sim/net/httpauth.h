@@ -22,6 +22,9 @@ class HttpAuth {
   bool Accepts(const HttpRequest& request) const;
   // The 401 response with the challenge of this scheme.
   std::string Challenge() const;
+  // The challenge's header line alone ("WWW-Authenticate: ..."), for other protocols that
+  // authenticate like HTTP (RTSP).
+  std::string ChallengeHeader() const;
   AuthScheme Scheme() const { return scheme_; }
 
  private:

@@ -29,29 +29,6 @@ size_t HeadEnd(const std::string& buffer) {
   return lf + 2;
 }
 
-bool ParseHead(std::string_view head, HttpRequest& request) {
-  size_t line_end = head.find('\n');
-  std::string_view line = TrimBlanks(head.substr(0, line_end), kHeaderBlanks);
-  size_t sp1 = line.find(' ');
-  size_t sp2 = line.rfind(' ');
-  if (sp1 == std::string_view::npos || sp2 == sp1) return false;
-  request.method = std::string(line.substr(0, sp1));
-  request.target = std::string(TrimBlanks(line.substr(sp1 + 1, sp2 - sp1 - 1), kHeaderBlanks));
-  request.version = std::string(line.substr(sp2 + 1));
-  if (request.method.empty() || request.target.empty()) return false;
-  while (line_end != std::string_view::npos) {
-    head.remove_prefix(line_end + 1);
-    line_end = head.find('\n');
-    line = TrimBlanks(head.substr(0, line_end), kHeaderBlanks);
-    if (line.empty()) break;
-    size_t colon = line.find(':');
-    if (colon == std::string_view::npos) continue;
-    request.headers.emplace_back(std::string(TrimBlanks(line.substr(0, colon), kHeaderBlanks)),
-                                 std::string(TrimBlanks(line.substr(colon + 1), kHeaderBlanks)));
-  }
-  return true;
-}
-
 enum class ReadResult { kOk, kGone, kBad, kHeadTooLarge, kBodyTooLarge };
 
 // Reads the request head and discards a Content-Length body.
@@ -71,7 +48,7 @@ ReadResult ReadRequest(TcpConnection& tcp, HttpRequest& request) {
     if (n <= 0) return ReadResult::kGone;
     buffer.append(chunk, static_cast<size_t>(n));
   }
-  if (!ParseHead(std::string_view(buffer).substr(0, head_end), request)) return ReadResult::kBad;
+  if (!ParseRequestHead(std::string_view(buffer).substr(0, head_end), request)) return ReadResult::kBad;
   std::string length_text = request.Header("Content-Length");
   if (length_text.empty()) return ReadResult::kOk;
   char* end = nullptr;
@@ -125,6 +102,29 @@ void Serve(const HttpHandler& handler, TcpConnection& tcp) {
 }
 
 }  // namespace
+
+bool ParseRequestHead(std::string_view head, HttpRequest& request) {
+  size_t line_end = head.find('\n');
+  std::string_view line = TrimBlanks(head.substr(0, line_end), kHeaderBlanks);
+  size_t sp1 = line.find(' ');
+  size_t sp2 = line.rfind(' ');
+  if (sp1 == std::string_view::npos || sp2 == sp1) return false;
+  request.method = std::string(line.substr(0, sp1));
+  request.target = std::string(TrimBlanks(line.substr(sp1 + 1, sp2 - sp1 - 1), kHeaderBlanks));
+  request.version = std::string(line.substr(sp2 + 1));
+  if (request.method.empty() || request.target.empty()) return false;
+  while (line_end != std::string_view::npos) {
+    head.remove_prefix(line_end + 1);
+    line_end = head.find('\n');
+    line = TrimBlanks(head.substr(0, line_end), kHeaderBlanks);
+    if (line.empty()) break;
+    size_t colon = line.find(':');
+    if (colon == std::string_view::npos) continue;
+    request.headers.emplace_back(std::string(TrimBlanks(line.substr(0, colon), kHeaderBlanks)),
+                                 std::string(TrimBlanks(line.substr(colon + 1), kHeaderBlanks)));
+  }
+  return true;
+}
 
 std::string HttpRequest::Header(std::string_view name) const {
   for (const auto& [key, value] : headers) {

@@ -36,6 +36,10 @@ struct HttpRequest {
   std::string Path() const;
 };
 
+// Parses a request head (request line and header lines, up to its blank line; LF or CR LF)
+// into request. False when the request line is malformed. RTSP requests have the same shape.
+bool ParseRequestHead(std::string_view head, HttpRequest& request);
+
 class HttpConnection {
  public:
   virtual ~HttpConnection() = default;

@@ -55,5 +55,34 @@ TEST_F(SimWatchTest, CamerasWithoutEntriesAreLeftOut) {
   EXPECT_TRUE(evwatch::WatchConfig(SimWatch(sim_.Cameras(), options), 500)["cameras"].empty());
 }
 
+TEST(SimWatchRtspTest, VivotekCameraNamesItsRtspStreamAndStreamType) {
+  Simulator sim;
+  SimOptions options;
+  options.emulations = {"vivotek"};
+  std::string error;
+  ASSERT_TRUE(sim.Start(options, &error)) << error;
+  const SimCamera& camera = sim.Cameras().at(0);
+  ASSERT_GT(camera.tcp_port, 0);
+  nlohmann::ordered_json c = evwatch::WatchConfig(SimWatch(sim.Cameras(), {}), 500);
+  ASSERT_EQ(c["cameras"].size(), 1u);
+  const auto& cam = c["cameras"][0];
+  EXPECT_EQ(cam["stream_type"], 1);
+  EXPECT_EQ(cam["video_type"], 1);
+  // The motion-JPEG stream stays the default; the RTSP stream is the one for (1, 1).
+  EXPECT_EQ(cam["api"]["stream"]["path"], "/video.mjpg");
+  EXPECT_EQ(cam["api"]["stream"]["port"], camera.port);
+  EXPECT_EQ(cam["api"]["streams"]["1,1"]["path"], "/live.sdp");
+  EXPECT_EQ(cam["api"]["streams"]["1,1"]["port"], camera.tcp_port);
+  bool watched = false;
+  for (const auto& d : cam["detectors"]) watched = watched || d["class"] == "VivotekMp4MD";
+  EXPECT_TRUE(watched);
+}
+
+TEST_F(SimWatchTest, CamerasWithoutStreamTypesLeaveThemOut) {
+  nlohmann::ordered_json c = evwatch::WatchConfig(SimWatch(sim_.Cameras(), {}), 500);
+  EXPECT_FALSE(c["cameras"][0].contains("stream_type"));
+  EXPECT_FALSE(c["cameras"][0].contains("video_type"));
+}
+
 }  // namespace
 }  // namespace evsim

@@ -5,12 +5,16 @@
 #include <gtest/gtest.h>
 
 #include <memory>
+#include <optional>
 #include <string>
+#include <utility>
 
 #include "detectors/ipux.h"
 #include "detectors/media/jpghdrdetector.h"
+#include "detectors/media/rtphdrdetector.h"
 #include "framework/host/camera.h"
 #include "framework/host/fetcher.h"
+#include "framework/host/rtpfetch.h"
 #include "sim/scene/mjpeg.h"
 #include "sim/simulator.h"
 
@@ -123,6 +127,75 @@ TEST_F(MediaEmulationTest, VivotekFramesCarryBothRecords) {
   EXPECT_EQ(r.level, 127u);
   cam_->state->SetMotion(50);
   EXPECT_EQ(Judge(app2, Part("/video.mjpg")).level, 63u);
+}
+
+// The verdict on the extension of the next RTP packet, or nullopt when the reader fails.
+std::optional<std::pair<bool, unsigned int>> NextMp4Reading(RtpFetch& fetch) {
+  unsigned int length = 0;
+  if (fetch.NextHdrInfo(length) != 0 || length == 0) return std::nullopt;
+  std::string data(length, '\0');
+  if (fetch.FetchExtData(reinterpret_cast<unsigned char*>(&data[0]), length) != 0) {
+    return std::nullopt;
+  }
+  VivotekMp4MD judge(nullptr, nullptr, VIVO_FUNC_GR_APP0);
+  unsigned int level = 0;
+  bool state = judge.IsEventDetected(&data[0], length, level);
+  return std::make_pair(state, level);
+}
+
+// Reads packets until one shows `state` (at most 200); its level, or -1.
+int LevelOnceStateIs(RtpFetch& fetch, bool state) {
+  for (int i = 0; i < 200; ++i) {
+    auto reading = NextMp4Reading(fetch);
+    if (!reading) return -1;
+    if (reading->first == state) return static_cast<int>(reading->second);
+  }
+  return -1;
+}
+
+TEST_F(MediaEmulationTest, VivotekRtpPacketsCarryTheMpeg4Record) {
+  Start("vivotek");
+  ASSERT_GT(cam_->tcp_port, 0);
+  RtpFetch fetch("127.0.0.1", cam_->tcp_port, "/live.sdp", "", "", "RTPExPlayer");
+  auto first = NextMp4Reading(fetch);
+  ASSERT_TRUE(first.has_value());
+  EXPECT_FALSE(first->first);
+  EXPECT_EQ(first->second, 0u);
+  cam_->state->SetMotion(100);
+  EXPECT_EQ(LevelOnceStateIs(fetch, true), 127);
+  cam_->state->SetMotion(50);
+  for (int i = 0; i < 200; ++i) {
+    auto reading = NextMp4Reading(fetch);
+    ASSERT_TRUE(reading.has_value());
+    if (reading->second == 63u) break;
+    ASSERT_EQ(reading->second, 127u) << "only the old level comes before the new one";
+  }
+  cam_->state->SetMotion(0);
+  EXPECT_EQ(LevelOnceStateIs(fetch, false), 0);
+  // A camera that falls silent ends its session.
+  cam_->state->SetSilent(true);
+  EXPECT_EQ(LevelOnceStateIs(fetch, true), -1);
+  EXPECT_FALSE(NextMp4Reading(fetch).has_value());
+}
+
+TEST(VivotekRtspAuthTest, RtspAsksForTheSimulatorsCredentials) {
+  Simulator sim;
+  SimOptions options;
+  options.emulations = {"vivotek"};
+  options.auth = AuthScheme::kBasic;
+  options.user = "admin";
+  options.password = "pw";
+  std::string error;
+  ASSERT_TRUE(sim.Start(options, &error)) << error;
+  const int port = sim.Cameras().at(0).tcp_port;
+  RtpFetch good("127.0.0.1", port, "/live.sdp", "admin", "pw", "RTPExPlayer");
+  unsigned int length = 0;
+  EXPECT_EQ(good.NextHdrInfo(length), 0);
+  EXPECT_GT(length, 0u);
+  RtpFetch bad("127.0.0.1", port, "/live.sdp", "admin", "other", "RTPExPlayer", 2);
+  EXPECT_NE(bad.NextHdrInfo(length), 0);
+  RtpFetch none("127.0.0.1", port, "/live.sdp", "", "", "RTPExPlayer", 2);
+  EXPECT_NE(none.NextHdrInfo(length), 0);
 }
 
 TEST_F(MediaEmulationTest, JvcComFlagsMotionAtByte233) {
