@@ -151,6 +151,13 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                  "status records pushed at the API's stream (video type, 2), or "
                                  "from the frame buffer, one per 16 ms pass; motion while the "
                                  "level of byte 24 exceeds the API's threshold"),
+      Row<IQeyeV1MD, Cam>("IQeyeV1MD", "IQeye", K::kMotion,
+                          "server push at /now.jpg?snap=spush&pragma=motion; motion while the "
+                          "Pragma: trigger= line after a picture names motion"),
+      Row<IQeyeV2EID, Cam, Inputs>("IQeyeV2EID", "IQeye", K::kInput,
+                                   "server push at /now.jpg?snap=spush&pragma=trigger&noimage, "
+                                   "one part a second; active while the Pragma: trigger= line "
+                                   "names an input (any input)"),
       Row<IQeyeV2MD, Cam>("IQeyeV2MD", "IQeye", K::kMotion,
                           "motion data pushed at /now.motiondata; motion while a line "
                           "window=N;level=L;threshold=T has L > T"),
