@@ -21,6 +21,7 @@ Emulation PanasonicEmulation();
 Emulation PsiaEmulation();
 Emulation SanyoEmulation();
 Emulation SceneEmulation();
+Emulation SonyEmulation();
 Emulation VivotekEmulation();
 Emulation YcamEmulation();
 Emulation ZavioEmulation();
@@ -42,6 +43,7 @@ const std::vector<Emulation>& Emulations() {
       PsiaEmulation(),
       SanyoEmulation(),
       SceneEmulation(),
+      SonyEmulation(),
       VivotekEmulation(),
       YcamEmulation(),
       ZavioEmulation(),

@@ -17,6 +17,7 @@
 #include "detectors/media/jpghdrdetector.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
+#include "detectors/sony.h"
 #include "detectors/ycam.h"
 #include "detectors/zavio.h"
 #include "framework/host/camera.h"
@@ -181,6 +182,12 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),
+      Row<SONYMD, Cam>("SONYMD", "Sony", K::kMotion,
+                       "alarm data pushed at /command/alarmdata.cgi?interval=1; motion (level "
+                       "100) while a line OdWinN=V has the value 1"),
+      Row<SONYEID, Cam, Inputs>("SONYEID", "Sony", K::kInput,
+                                "alarm data pushed at /command/alarmdata.cgi?interval=1, one "
+                                "part a second; active while a line SensorN=1 has N <= inputs"),
       Row<VivotekJpgMD, Cam, Buf, Api, VivoGroup>(
           "VivotekJpgMD", "Vivotek", K::kMotion,
           "JPEG frames of the API's stream (1, 2) or the frame buffer; motion flag and level in "
