@@ -13,6 +13,7 @@ Emulation AxisEmulation();
 Emulation CanonEmulation();
 Emulation ComproEmulation();
 Emulation DLinkEmulation();
+Emulation EtrovisionEmulation();
 Emulation HikVisionEmulation();
 Emulation IpuxEmulation();
 Emulation IqeyeEmulation();
@@ -35,6 +36,7 @@ const std::vector<Emulation>& Emulations() {
       CanonEmulation(),
       ComproEmulation(),
       DLinkEmulation(),
+      EtrovisionEmulation(),
       HikVisionEmulation(),
       IpuxEmulation(),
       IqeyeEmulation(),

@@ -10,6 +10,7 @@
 #include "detectors/canon.h"
 #include "detectors/compro.h"
 #include "detectors/dlink.h"
+#include "detectors/etrovision.h"
 #include "detectors/hikvision.h"
 #include "detectors/ipux.h"
 #include "detectors/iqeye.h"
@@ -138,6 +139,12 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<DLINKEID, Cam, Inputs>("DLINKEID", "D-Link", K::kInput,
                                  "GET /config/notify.cgi once a second per input N = 1..inputs, "
                                  "up to the first whose line says inputN=on"),
+      Row<ETROVISIONMD, Cam, Api>("ETROVISIONMD", "Etrovision", K::kMotion,
+                                  "event stream at the API's stream path and port; motion (level "
+                                  "100) while a line begins md1=on (any case)"),
+      Row<ETROVISIONEID, Cam, Api, Inputs>("ETROVISIONEID", "Etrovision", K::kInput,
+                                           "event stream at the API's stream path and port; "
+                                           "active while a line inputN=on has N <= inputs"),
       Row<HikVisionMD, Cam>("HikVisionMD", "HikVision", K::kMotion,
                             "alert stream /Event/notification/alertStream, every fourth record; "
                             "motion when a VMD record's activePostCount changed"),
