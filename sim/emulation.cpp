@@ -13,6 +13,7 @@ Emulation AxisEmulation();
 Emulation CanonEmulation();
 Emulation ComproEmulation();
 Emulation DLinkEmulation();
+Emulation EdimaxEmulation();
 Emulation EtrovisionEmulation();
 Emulation HikVisionEmulation();
 Emulation IpuxEmulation();
@@ -36,6 +37,7 @@ const std::vector<Emulation>& Emulations() {
       CanonEmulation(),
       ComproEmulation(),
       DLinkEmulation(),
+      EdimaxEmulation(),
       EtrovisionEmulation(),
       HikVisionEmulation(),
       IpuxEmulation(),

@@ -10,6 +10,7 @@
 #include "detectors/canon.h"
 #include "detectors/compro.h"
 #include "detectors/dlink.h"
+#include "detectors/edimax.h"
 #include "detectors/etrovision.h"
 #include "detectors/hikvision.h"
 #include "detectors/ipux.h"
@@ -139,6 +140,10 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<DLINKEID, Cam, Inputs>("DLINKEID", "D-Link", K::kInput,
                                  "GET /config/notify.cgi once a second per input N = 1..inputs, "
                                  "up to the first whose line says inputN=on"),
+      Row<EDIMAXMD, Cam, Api>("EDIMAXMD", "Edimax", K::kMotion,
+                              "event stream at the API's stream path on the camera's own port; "
+                              "motion (level 100) while a part's header lines say "
+                              "motion-event: 1"),
       Row<ETROVISIONMD, Cam, Api>("ETROVISIONMD", "Etrovision", K::kMotion,
                                   "event stream at the API's stream path and port; motion (level "
                                   "100) while a line begins md1=on (any case)"),
