@@ -20,6 +20,7 @@ Emulation IpuxEmulation();
 Emulation IqeyeEmulation();
 Emulation JvcEmulation();
 Emulation PanasonicEmulation();
+Emulation PixordEmulation();
 Emulation PsiaEmulation();
 Emulation SanyoEmulation();
 Emulation SceneEmulation();
@@ -44,6 +45,7 @@ const std::vector<Emulation>& Emulations() {
       IqeyeEmulation(),
       JvcEmulation(),
       PanasonicEmulation(),
+      PixordEmulation(),
       PsiaEmulation(),
       SanyoEmulation(),
       SceneEmulation(),

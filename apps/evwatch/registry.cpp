@@ -15,6 +15,7 @@
 #include "detectors/hikvision.h"
 #include "detectors/ipux.h"
 #include "detectors/iqeye.h"
+#include "detectors/pixord.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
 #include "detectors/psia.h"
@@ -181,6 +182,14 @@ const std::vector<DetectorClass>& DetectorClasses() {
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "
           "(level byte 13 x 5), inputs from bits 7 and 6 of byte 0 by function group"),
+      Row<PIXORDMD, Cam, Api>("PIXORDMD", "Pixord", K::kMotion,
+                              "motion data pushed at the API's stream path; motion while a line "
+                              "group=G;level=L;sensitivity=S; has L > the API's threshold "
+                              "(md_params, second value, read at start; signed)"),
+      Row<PIXORDEID, Cam, Inputs>("PIXORDEID", "Pixord", K::kInput,
+                                  "GET /cgi-bin/admin/sm.cgi?actions=listgroup&Input once a "
+                                  "second per input N = 0..inputs-1, up to the first line "
+                                  "Input.I0N.Status=high"),
       Row<PSIAMD, Cam>("PSIAMD", "PSIA", K::kMotion,
                        "alert stream /PSIA/Custom/Event/notification/alertStream, every fourth "
                        "record; motion when a VMD record's activePostCount changed"),
