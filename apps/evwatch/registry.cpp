@@ -15,6 +15,7 @@
 #include "detectors/hikvision.h"
 #include "detectors/ipux.h"
 #include "detectors/iqeye.h"
+#include "detectors/panasonic.h"
 #include "detectors/pixord.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
@@ -182,6 +183,14 @@ const std::vector<DetectorClass>& DetectorClasses() {
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "
           "(level byte 13 x 5), inputs from bits 7 and 6 of byte 0 by function group"),
+      Row<PanaMD, Cam, Api>("PanaMD", "Panasonic", K::kMotion,
+                            "status lines pushed at the API's stream (time-out 20 s); motion "
+                            "(level 100) while a line says motiondetect T (channel 1) or "
+                            "motiondetect chNT (channel N)"),
+      Row<PanaEID, Cam, Api, Inputs>("PanaEID", "Panasonic", K::kInput,
+                                     "status lines pushed at the API's stream (time-out 20 s; "
+                                     "without one, an empty path on port 80); active while a "
+                                     "line terminalN I L has N in 1..inputs"),
       Row<PIXORDMD, Cam, Api>("PIXORDMD", "Pixord", K::kMotion,
                               "motion data pushed at the API's stream path; motion while a line "
                               "group=G;level=L;sensitivity=S; has L > the API's threshold "
