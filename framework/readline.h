@@ -25,7 +25,8 @@ enum class LineVerdict {
 };
 
 // Reads buf[0, length) line by line with ReadLineFromBuf into a kScanLineSize buffer (a
-// longer line goes on as the next line) and calls judge(line) (LineVerdict(const char*)) on
+// longer line is cut at 127 characters, its 128th is lost and the rest is the next line)
+// and calls judge(line) (LineVerdict(const char*)) on
 // each non-empty one, until it says kEvent (1) or kEnd (0) or the text ends (0). A negative
 // length returns 0 at once, judging nothing.
 template <typename Judge>
