@@ -5,6 +5,8 @@
 
 #include <gtest/gtest.h>
 
+#include <chrono>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -97,8 +99,6 @@ using evtest::FollowedAcrossOutage;
 using evtest::InputReading;
 using evtest::OutageHandler;
 using evtest::RawPart;
-using evtest::ReadInputParts;
-using evtest::ReadRawMotionParts;
 
 const char kMotionPush[] = "/now.jpg?snap=spush&pragma=motion";
 const char kTriggerPush[] = "/now.jpg?snap=spush&pragma=trigger&noimage";
@@ -111,14 +111,26 @@ std::string Picture(const std::string& trigger, size_t size = 200) {
 
 class IQeyePushTest : public ::testing::Test {
  protected:
+  // Pushes part and, to give its trailing text an end, the start of a next part; reads one.
+  std::unique_ptr<MultipartFetch> PushOne(const char* target, const std::string& part) {
+    Push push{{part, "--myboundary\r\n"}};
+    push.raw = true;
+    cam_.Handle(target, evtest::PushHandler({push}));
+    return evtest::FetchFrom(cam_, target);
+  }
   MotionReading Motion(const std::string& part) {
     IQeyeV1MD detector(&camera_);
-    // A second part gives the first one's trailing text its end.
-    return ReadRawMotionParts(cam_, kMotionPush, detector, {part, Picture("none")})[0];
+    auto fetch = PushOne(kMotionPush, part);
+    MotionReading r{0, true, 77};
+    r.result = detector.DoMD(fetch.get(), r.motion, r.level);
+    return r;
   }
   InputReading Input(const std::string& part, int inputs = 1) {
     IQeyeV2EID detector(&camera_, inputs);
-    return ReadInputParts(cam_, kTriggerPush, detector, {part, Picture("none")}, true)[0];
+    auto fetch = PushOne(kTriggerPush, part);
+    InputReading r{0, true};
+    r.result = detector.DoEID(fetch.get(), r.active);
+    return r;
   }
 
   FakeCamera cam_;
