@@ -29,6 +29,7 @@ constexpr int kStreamTimeout = 10;
 struct StreamLoopShape {
   int timeout = kStreamTimeout;  // the reader's, in seconds
   int period = 0;  // microseconds from the start of one pass to the next; 0: no pacing
+  DelayTimer::Clock* clock = nullptr;  // the pacing clock; null: DelayTimer's system clock
 };
 
 // A reader of the multipart stream at path on the camera's host and `port`, with the
@@ -50,7 +51,8 @@ void RunStreamLoop(DetectorBase& detector, EventBuf* buffer, const Camera& camer
   std::unique_ptr<MultipartFetch> fetch = OpenPartStream(camera, path, port, shape.timeout);
   std::optional<DelayTimer> timer;
   if (shape.period > 0) {
-    timer.emplace(shape.period);
+    timer.emplace(shape.period,
+                  shape.clock != nullptr ? shape.clock : DelayTimer::SystemClock());
     timer->BeginTiming();
   }
   while (fetch != nullptr && detector.IsStarted() == 1) {
