@@ -6,8 +6,6 @@
 
 namespace {
 
-const int kLineSize = 128;
-
 // sscanf's result for one line: EOF when the line ends before the first field.
 int ScanLine(const char* line, MotionLineFormat format, int* level, int* threshold) {
   switch (format) {
@@ -36,19 +34,17 @@ int ScanMotionLines(const char* body, int length, unsigned int& level, MotionLin
     return 0;
   }
   unsigned int largest = 0;
-  char line[kLineSize];
-  int position = -1;
-  do {
-    ReadLineFromBuf(body, position, length, line, kLineSize);
-    if (line[0] == '\0') continue;
+  const int motion = ScanLines(body, length, [&](const char* line) {
     int found_level = 0;
     int threshold = 0;
     const int fields = ScanLine(line, format, &found_level, &threshold);
     level = static_cast<unsigned int>(found_level);
-    if (fields == EOF) break;
-    if (level > static_cast<unsigned int>(threshold)) return 1;
+    if (fields == EOF) return LineVerdict::kEnd;
+    if (level > static_cast<unsigned int>(threshold)) return LineVerdict::kEvent;
     if (level > largest) largest = level;
-  } while (length > position);
+    return LineVerdict::kNext;
+  });
+  if (motion == 1) return 1;
   if (idle == IdleLevel::kLargest) level = largest;
   return 0;
 }

@@ -37,18 +37,22 @@ enum class IdleLevel {
 int ScanMotionLines(const char* body, int length, unsigned int& level, MotionLineFormat format,
                     IdleLevel idle);
 
-// One part of a motion-data stream: clears motion and level, reads the part and sets motion
-// to judge(body, length, level) (bool). 0 when a part was read and judged; -1 when there is
-// no fetcher or the part could not be read (the fetcher has skipped what was left of it).
+// One part of a motion-data stream: clears motion and level, reads the part as `shape` says
+// and sets motion to judge(text, length, level) (bool) over what StreamPart gives to judge.
+// 0 when a part was read and judged; -1 when there is no fetcher or the part could not be
+// read (the fetcher has skipped what was left of it).
+template <typename Judge>
+int ReadMotionPart(MultipartFetch* fetch, const StreamPart::Shape& shape, bool& motion,
+                   unsigned int& level, Judge&& judge) {
+  level = 0;
+  return ReadJudgedPart(fetch, shape, motion,
+                        [&](char* text, int length) { return judge(text, length, level); });
+}
+
+// The same with the plain shape: the body judged over the part's length.
 template <typename Judge>
 int ReadMotionPart(MultipartFetch* fetch, bool& motion, unsigned int& level, Judge&& judge) {
-  motion = false;
-  level = 0;
-  if (fetch == nullptr) return -1;
-  StreamPart part;
-  if (part.Read(fetch, false) != StreamPart::kRead) return -1;
-  motion = judge(part.Body(), part.Length(), level);
-  return 0;
+  return ReadMotionPart(fetch, StreamPart::Shape{}, motion, level, judge);
 }
 
 // The worker loop of a detector whose stream the camera's CameraAPI names (path and port):
@@ -60,7 +64,7 @@ void RunApiMotionDataLoop(DetectorBase& detector, EventBuf* buffer, Camera* came
   if (camera == nullptr || api == nullptr) return;
   std::string path;
   int port = 80;
-  if (api->GetStreamPath(path, port) != 0) return;
+  if (!GetApiStream(*api, path, port)) return;
   RunMotionStreamLoop(detector, buffer, *camera, path, port, doMD);
 }
 

@@ -15,6 +15,8 @@ Emulation BrickcomEmulation();
 Emulation CanonEmulation();
 Emulation ComproEmulation();
 Emulation DLinkEmulation();
+Emulation EdimaxEmulation();
+Emulation EtrovisionEmulation();
 Emulation HikVisionEmulation();
 Emulation IpuxEmulation();
 Emulation IqeyeEmulation();
@@ -24,9 +26,11 @@ Emulation MessoaEmulation();
 Emulation MessoaProEmulation();
 Emulation MobotixEmulation();
 Emulation PanasonicEmulation();
+Emulation PixordEmulation();
 Emulation PsiaEmulation();
 Emulation SanyoEmulation();
 Emulation SceneEmulation();
+Emulation SonyEmulation();
 Emulation StorageEmulation();
 Emulation VivotekEmulation();
 Emulation YcamEmulation();
@@ -43,6 +47,8 @@ const std::vector<Emulation>& Emulations() {
       CanonEmulation(),
       ComproEmulation(),
       DLinkEmulation(),
+      EdimaxEmulation(),
+      EtrovisionEmulation(),
       HikVisionEmulation(),
       IpuxEmulation(),
       IqeyeEmulation(),
@@ -52,9 +58,11 @@ const std::vector<Emulation>& Emulations() {
       MessoaProEmulation(),
       MobotixEmulation(),
       PanasonicEmulation(),
+      PixordEmulation(),
       PsiaEmulation(),
       SanyoEmulation(),
       SceneEmulation(),
+      SonyEmulation(),
       StorageEmulation(),
       VivotekEmulation(),
       YcamEmulation(),

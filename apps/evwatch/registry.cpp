@@ -13,11 +13,15 @@
 #include "detectors/canon.h"
 #include "detectors/compro.h"
 #include "detectors/dlink.h"
+#include "detectors/edimax.h"
+#include "detectors/etrovision.h"
 #include "detectors/hikvision.h"
 #include "detectors/ipux.h"
 #include "detectors/iqeye.h"
 #include "detectors/jvc.h"
 #include "detectors/levelone.h"
+#include "detectors/panasonic.h"
+#include "detectors/pixord.h"
 #include "detectors/media/jpegmd.h"
 #include "detectors/media/jpghdrdetector.h"
 #include "detectors/media/rtphdrdetector.h"
@@ -26,6 +30,7 @@
 #include "detectors/mobotix.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
+#include "detectors/sony.h"
 #include "detectors/storage.h"
 #include "detectors/vivotek.h"
 #include "detectors/ycam.h"
@@ -160,6 +165,16 @@ const std::vector<DetectorClass>& DetectorClasses() {
       Row<DLINKEID, Cam, InputCount>("DLINKEID", "D-Link", K::kInput,
                                  "GET /config/notify.cgi once a second per input N = 1..inputs, "
                                  "up to the first whose line says inputN=on"),
+      Row<EDIMAXMD, Cam, Api>("EDIMAXMD", "Edimax", K::kMotion,
+                              "event stream at the API's stream path on the camera's own port; "
+                              "motion (level 100) while a part's header lines say "
+                              "motion-event: 1"),
+      Row<ETROVISIONMD, Cam, Api>("ETROVISIONMD", "Etrovision", K::kMotion,
+                                  "event stream at the API's stream path and port; motion (level "
+                                  "100) while a line begins md1=on (any case)"),
+      Row<ETROVISIONEID, Cam, Api, Inputs>("ETROVISIONEID", "Etrovision", K::kInput,
+                                           "event stream at the API's stream path and port; "
+                                           "active while a line inputN=on has N <= inputs"),
       Row<HikVisionMD, Cam>("HikVisionMD", "HikVision", K::kMotion,
                             "alert stream /Event/notification/alertStream, every fourth record; "
                             "motion when a VMD record's activePostCount changed"),
@@ -174,6 +189,13 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                  "status records pushed at the API's stream (video type, 2), or "
                                  "from the frame buffer, one per 16 ms pass; motion while the "
                                  "level of byte 24 exceeds the API's threshold"),
+      Row<IQeyeV1MD, Cam>("IQeyeV1MD", "IQeye", K::kMotion,
+                          "server push at /now.jpg?snap=spush&pragma=motion; motion while the "
+                          "Pragma: trigger= line after a picture names motion"),
+      Row<IQeyeV2EID, Cam, Inputs>("IQeyeV2EID", "IQeye", K::kInput,
+                                   "server push at /now.jpg?snap=spush&pragma=trigger&noimage, "
+                                   "one part a second; active while the Pragma: trigger= line "
+                                   "names an input (any input)"),
       Row<IQeyeV2MD, Cam>("IQeyeV2MD", "IQeye", K::kMotion,
                           "motion data pushed at /now.motiondata; motion while a line "
                           "window=N;level=L;threshold=T has L > T"),
@@ -212,6 +234,22 @@ const std::vector<DetectorClass>& DetectorClasses() {
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "
           "(level byte 13 x 5), inputs from bits 7 and 6 of byte 0 by function group"),
+      Row<PanaMD, Cam, Api>("PanaMD", "Panasonic", K::kMotion,
+                            "status lines pushed at the API's stream (time-out 20 s); motion "
+                            "(level 100) while a line says motiondetect T (channel 1) or "
+                            "motiondetect chNT (channel N)"),
+      Row<PanaEID, Cam, Api, Inputs>("PanaEID", "Panasonic", K::kInput,
+                                     "status lines pushed at the API's stream (time-out 20 s; "
+                                     "without one, an empty path on port 80); active while a "
+                                     "line terminalN I L has N in 1..inputs"),
+      Row<PIXORDMD, Cam, Api>("PIXORDMD", "Pixord", K::kMotion,
+                              "motion data pushed at the API's stream path; motion while a line "
+                              "group=G;level=L;sensitivity=S; has L > the API's threshold "
+                              "(md_params, second value, read at start; signed)"),
+      Row<PIXORDEID, Cam, Inputs>("PIXORDEID", "Pixord", K::kInput,
+                                  "GET /cgi-bin/admin/sm.cgi?actions=listgroup&Input once a "
+                                  "second per input N = 0..inputs-1, up to the first line "
+                                  "Input.I0N.Status=high"),
       Row<PSIAMD, Cam>("PSIAMD", "PSIA", K::kMotion,
                        "alert stream /PSIA/Custom/Event/notification/alertStream, every fourth "
                        "record; motion when a VMD record's activePostCount changed"),
@@ -225,6 +263,12 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                       "GET the API's stream path once a second: a 48-byte status "
                                       "record; active (level 100) while a bit 0..inputs-1 of byte "
                                       "33 is set"),
+      Row<SONYMD, Cam>("SONYMD", "Sony", K::kMotion,
+                       "alarm data pushed at /command/alarmdata.cgi?interval=1; motion (level "
+                       "100) while a line OdWinN=V has the value 1"),
+      Row<SONYEID, Cam, Inputs>("SONYEID", "Sony", K::kInput,
+                                "alarm data pushed at /command/alarmdata.cgi?interval=1, one "
+                                "part a second; active while a line SensorN=1 has N <= inputs"),
       Row<StorageMD, Cam, Api>("StorageMD", "Storage", K::kMotion,
                                "GET the API's stream path and port once per interval; motion "
                                "while the answer's alarm_status (its first ';' dropped) is 1 or 3"),

@@ -4,7 +4,13 @@
 // the camera's function group: group 0 sets bit 7 while input 1 is active, group 1 (asked
 // with "group=1" in the query) keeps bits 7 and 6 set while it is idle and clears bit 6
 // while it is active.
+//
+// The same cameras push their state as text lines at /nphStatusStream (the API's default
+// stream; the motion-JPEG stream is its stream (1, 2)), a part every 200 ms: "motiondetect
+// T|F" (T while the motion level is above 20 %) and "terminalN I L|H" for inputs 1 and 2
+// (L, low, while active).
 
+#include <chrono>
 #include <string>
 #include <vector>
 
@@ -20,6 +26,17 @@ constexpr int kComSize = 32;
 constexpr int kMotionStep = 5;        // percent per unit of byte 13
 constexpr unsigned char kMotionFloor = 2;  // byte 12: byte 13 above it means motion
 constexpr int kFps = 10;
+constexpr char kStatusPath[] = "/nphStatusStream";
+constexpr int kStatusInputs = 2;
+constexpr int kMotionThreshold = 20;
+
+std::string StatusLines(const CameraStatus& status) {
+  std::string text = std::string("motiondetect ") + (status.motion > kMotionThreshold ? "T" : "F") + "\r\n";
+  for (int n = 1; n <= kStatusInputs; ++n) {
+    text += "terminal" + std::to_string(n) + " I " + (status.Input(n) ? "L" : "H") + "\r\n";
+  }
+  return text;
+}
 
 std::string ComSegment(const CameraStatus& status, bool group1) {
   std::string com(kComSize, '\0');
@@ -34,6 +51,13 @@ std::string ComSegment(const CameraStatus& status, bool group1) {
 }
 
 void HandlePanasonic(HttpConnection& connection, CameraState& state) {
+  if (connection.Request().method == "GET" && connection.Request().Path() == kStatusPath) {
+    ServeMultipart(connection, "text/plain", std::chrono::milliseconds(200), [&]() -> std::string {
+      const CameraStatus status = state.Get();
+      return status.silent ? std::string() : StatusLines(status);
+    });
+    return;
+  }
   if (!ServesGetOf(connection, kStreamPath)) return;
   const HttpRequest& request = connection.Request();
   const bool group1 = request.target.find("group=1") != std::string::npos;
@@ -50,8 +74,14 @@ Emulation PanasonicEmulation() {
                              {
                                  {"PanaJpgED", "motion", {{"type", 0}}},
                                  {"PanaJpgED", "input", {{"type", 1}, {"function_group", 0}}},
+                                 {"PanaMD", "status-motion", nullptr},
+                                 {"PanaEID", "status-inputs", {{"inputs", 2}}},
                              });
-  e.api = StreamApi(std::string(kStreamPath) + kStreamQuery);
+  e.api = [](int port) {
+    return nlohmann::json{
+        {"stream", {{"path", kStatusPath}, {"port", port}}},
+        {"streams", {{"1,2", {{"path", std::string(kStreamPath) + kStreamQuery}, {"port", port}}}}}};
+  };
   return e;
 }
 

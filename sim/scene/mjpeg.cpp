@@ -143,22 +143,34 @@ std::string EncodeGreyJpeg(int width, int height, unsigned char grey,
   return EncodeJpeg(image, segments, options);
 }
 
-void ServeMultipart(HttpConnection& connection, const std::string& content_type,
-                    std::chrono::milliseconds period,
-                    const std::function<std::string()>& next_part) {
+void ServeMultipartParts(HttpConnection& connection, const std::string& content_type,
+                         std::chrono::milliseconds period,
+                         const std::function<std::optional<PushPart>()>& next_part) {
   const std::string head = std::string("HTTP/1.1 200 OK\r\n") +
                            "Content-Type: multipart/x-mixed-replace;boundary=" + kBoundary +
                            "\r\nCache-Control: no-cache\r\nConnection: close\r\n\r\n";
   if (!connection.Write(head)) return;
   for (;;) {
-    const std::string body = next_part();
-    if (body.empty()) return;
+    const std::optional<PushPart> next = next_part();
+    if (!next) return;
     std::string part = std::string("--") + kBoundary + "\r\nContent-Type: " + content_type +
-                       "\r\nContent-Length: " + std::to_string(body.size()) + "\r\n\r\n";
-    part += body;
+                       "\r\nContent-Length: " + std::to_string(next->body.size()) + "\r\n" +
+                       next->headers + "\r\n";
+    part += next->body;
     part += "\r\n";
+    part += next->trailer;
     if (!connection.Write(part) || !connection.SleepFor(period)) return;
   }
+}
+
+void ServeMultipart(HttpConnection& connection, const std::string& content_type,
+                    std::chrono::milliseconds period,
+                    const std::function<std::string()>& next_part) {
+  ServeMultipartParts(connection, content_type, period, [&]() -> std::optional<PushPart> {
+    std::string body = next_part();
+    if (body.empty()) return std::nullopt;
+    return PushPart{std::move(body), "", ""};
+  });
 }
 
 std::chrono::milliseconds FramePeriod(const HttpRequest& request, int default_fps) {

@@ -9,6 +9,7 @@
 
 #include <chrono>
 #include <functional>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -69,6 +70,18 @@ std::string EncodeGreyJpeg(int width, int height, unsigned char grey,
 void ServeMultipart(HttpConnection& connection, const std::string& content_type,
                     std::chrono::milliseconds period,
                     const std::function<std::string()>& next_part);
+
+// One part of a pushed stream, with the text that some cameras send around its body.
+struct PushPart {
+  std::string body;
+  std::string headers;  // further part-header lines, each ending in CR LF
+  std::string trailer;  // text after the body's CR LF and before the next boundary
+};
+
+// As ServeMultipart, with parts that carry such text; ends when next_part returns nullopt.
+void ServeMultipartParts(HttpConnection& connection, const std::string& content_type,
+                         std::chrono::milliseconds period,
+                         const std::function<std::optional<PushPart>()>& next_part);
 
 // The frame period that a stream request asks for with "fps=N" in its query (N in 1..100),
 // else 1 s / default_fps.

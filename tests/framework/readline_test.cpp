@@ -83,4 +83,49 @@ TEST(ReadLineFromBufTest, EmptyLinesCountZero) {
   EXPECT_STREQ(line, "x");
 }
 
+// The lines ScanLines hands to its judge, which says kNext to all of them.
+std::vector<std::string> LinesSeen(const std::string& text, int length) {
+  std::vector<std::string> seen;
+  EXPECT_EQ(ScanLines(text.data(), length, [&seen](const char* line) {
+              seen.push_back(line);
+              return LineVerdict::kNext;
+            }),
+            0);
+  return seen;
+}
+
+TEST(ScanLinesTest, JudgesEachNonEmptyLineUpToTheLength) {
+  EXPECT_EQ(LinesSeen("a\r\n\nb\nc", 8), (std::vector<std::string>{"a", "b", "c"}));
+  EXPECT_EQ(LinesSeen("a\nbc", 3), (std::vector<std::string>{"a", "b"}));
+  EXPECT_EQ(LinesSeen("a\rbc", 4), (std::vector<std::string>{"a", "c"})) << "CR skips a byte";
+  EXPECT_EQ(LinesSeen("abc", 0), (std::vector<std::string>{}));
+  EXPECT_EQ(LinesSeen("abc", -1), (std::vector<std::string>{}));
+}
+
+TEST(ScanLinesTest, LongLineIsCutAt127AndGoesOnAsTheNextLine) {
+  // The 128th character fills the line buffer and gives way to the terminator.
+  const std::string text = std::string(127, 'x') + "yz";
+  EXPECT_EQ(LinesSeen(text, static_cast<int>(text.size())),
+            (std::vector<std::string>{std::string(127, 'x'), "z"}));
+}
+
+TEST(ScanLinesTest, EventAndEndStopTheScan) {
+  const std::string text = "a\nstop\nb\nhit\nc\n";
+  std::vector<std::string> seen;
+  auto judge = [&seen](LineVerdict on_stop, LineVerdict on_hit) {
+    return [&seen, on_stop, on_hit](const char* line) {
+      seen.push_back(line);
+      if (std::string(line) == "stop") return on_stop;
+      if (std::string(line) == "hit") return on_hit;
+      return LineVerdict::kNext;
+    };
+  };
+  const int length = static_cast<int>(text.size());
+  EXPECT_EQ(ScanLines(text.data(), length, judge(LineVerdict::kEnd, LineVerdict::kEvent)), 0);
+  EXPECT_EQ(seen, (std::vector<std::string>{"a", "stop"}));
+  seen.clear();
+  EXPECT_EQ(ScanLines(text.data(), length, judge(LineVerdict::kNext, LineVerdict::kEvent)), 1);
+  EXPECT_EQ(seen, (std::vector<std::string>{"a", "stop", "b", "hit"}));
+}
+
 }  // namespace

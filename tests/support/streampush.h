@@ -12,12 +12,14 @@
 #define EVWATCH_TESTS_SUPPORT_STREAMPUSH_H_
 
 #include <chrono>
+#include <gtest/gtest.h>
 #include <iosfwd>
 #include <memory>
 #include <string>
 #include <vector>
 
 #include "framework/host/fetcher.h"
+#include "tests/support/eventrecorder.h"
 #include "tests/support/fakecamera.h"
 
 namespace evtest {
@@ -35,7 +37,17 @@ struct Push {
   std::chrono::milliseconds gap{0};  // wait before every part after the first
   std::string content_type = "text/plain";
   int status = 200;  // other than 200: that answer and no stream
+  // The parts are whole part texts, from the boundary line on (RawPart builds them),
+  // written as they stand, for cameras that send text around their bodies.
+  bool raw = false;
 };
+
+// A whole part as raw pushes write it: "--myboundary", the Content-Type, Content-Length and
+// `headers` lines (each without its line end), a blank line, the body, CR LF, then
+// `trailer` as it stands (text before the next boundary).
+std::string RawPart(const std::string& body, const std::vector<std::string>& headers = {},
+                    const std::string& trailer = "",
+                    const std::string& content_type = "text/plain");
 
 // A FakeCamera handler: the n-th connection (from 0) gets pushes[min(n, size - 1)].
 // REQUIRES: pushes is not empty.
@@ -74,6 +86,63 @@ std::vector<MotionReading> ReadMotionParts(FakeCamera& camera, const std::string
   }
   return readings;
 }
+
+// One DoEID reading: its result and state.
+struct InputReading {
+  int result;
+  bool active;
+  bool operator==(const InputReading& o) const { return result == o.result && active == o.active; }
+};
+void PrintTo(const InputReading& reading, std::ostream* os);
+
+// As ReadMotionParts, for detectors whose reading is DoEID(fetch, active) (preset to true).
+// With raw, the bodies are whole part texts (see RawPart).
+template <class Detector>
+std::vector<InputReading> ReadInputParts(FakeCamera& camera, const std::string& target,
+                                         Detector& detector,
+                                         const std::vector<std::string>& bodies,
+                                         bool raw = false) {
+  Push push{bodies};
+  push.raw = raw;
+  camera.Handle(target, PushHandler({push}));
+  std::unique_ptr<MultipartFetch> fetch = FetchFrom(camera, target);
+  std::vector<InputReading> readings;
+  for (size_t i = 0; i < bodies.size(); ++i) {
+    InputReading r{0, true};
+    r.result = detector.DoEID(fetch.get(), r.active);
+    readings.push_back(r);
+  }
+  return readings;
+}
+
+// As ReadMotionParts, with the bodies being whole part texts (see RawPart).
+template <class Detector>
+std::vector<MotionReading> ReadRawMotionParts(FakeCamera& camera, const std::string& target,
+                                              Detector& detector,
+                                              const std::vector<std::string>& parts) {
+  Push push{parts};
+  push.raw = true;
+  camera.Handle(target, PushHandler({push}));
+  std::unique_ptr<MultipartFetch> fetch = FetchFrom(camera, target);
+  std::vector<MotionReading> readings;
+  for (size_t i = 0; i < parts.size(); ++i) {
+    MotionReading r{0, true, 77};
+    r.result = detector.DoMD(fetch.get(), r.motion, r.level);
+    readings.push_back(r);
+  }
+  return readings;
+}
+
+// Pushes for a camera that stops pushing and comes back: the first connection gets `before`
+// and is closed, the second is refused (503), every later one gets `after` again and again
+// every 5 ms. With raw, the parts are whole part texts (see RawPart).
+FakeCamera::Handler OutageHandler(std::vector<std::string> before, std::string after,
+                                  bool raw = false);
+
+// Whether a run's reports show such a camera followed: `first` first, then at least one
+// (false, 0) while nothing could be read, then `back`.
+::testing::AssertionResult FollowedAcrossOutage(const std::vector<Report>& reports, Report first,
+                                                Report back);
 
 }  // namespace evtest
 
