@@ -22,31 +22,45 @@ sigset_t EndSignals() {
   return set;
 }
 
+// Whether BlockEndSignals took SIGHUP for WaitForEnd.
+bool reload_taken = false;
+
 }  // namespace
 
-void BlockEndSignals() {
+void BlockEndSignals(bool reload) {
   sigset_t set = EndSignals();
+  if (reload) {
+    sigaddset(&set, SIGHUP);
+    reload_taken = true;
+  }
   pthread_sigmask(SIG_BLOCK, &set, nullptr);
   signal(SIGPIPE, SIG_IGN);
 }
 
-EndReason WaitForEnd(std::optional<double> seconds, const std::function<bool()>& failed) {
-  using Clock = std::chrono::steady_clock;
-  const sigset_t set = EndSignals();
-  const auto deadline =
-      seconds ? Clock::now() + std::chrono::duration_cast<Clock::duration>(std::chrono::duration<double>(*seconds))
-              : Clock::time_point::max();
+EndReason WaitForEnd(std::optional<EndClock::time_point> deadline, const std::function<bool()>& failed) {
+  sigset_t set = EndSignals();
+  if (reload_taken) sigaddset(&set, SIGHUP);
   for (;;) {
     if (failed && failed()) return EndReason::kFailed;
     auto slice = std::chrono::milliseconds(200);
-    if (seconds) {
-      const auto left = deadline - Clock::now();
-      if (left <= Clock::duration::zero()) return EndReason::kDuration;
+    if (deadline) {
+      const auto left = *deadline - EndClock::now();
+      if (left <= EndClock::duration::zero()) return EndReason::kDuration;
       if (left < slice) slice = std::chrono::duration_cast<std::chrono::milliseconds>(left) + std::chrono::milliseconds(1);
     }
     struct timespec wait = {0, static_cast<long>(slice.count()) * 1000000L};
-    if (sigtimedwait(&set, nullptr, &wait) > 0) return EndReason::kSignal;
+    const int signal = sigtimedwait(&set, nullptr, &wait);
+    if (signal == SIGHUP) return EndReason::kReload;
+    if (signal > 0) return EndReason::kSignal;
   }
+}
+
+EndReason WaitForEnd(std::optional<double> seconds, const std::function<bool()>& failed) {
+  std::optional<EndClock::time_point> deadline;
+  if (seconds) {
+    deadline = EndClock::now() + std::chrono::duration_cast<EndClock::duration>(std::chrono::duration<double>(*seconds));
+  }
+  return WaitForEnd(deadline, failed);
 }
 
 void RunUnlessSignalled(const std::function<void()>& work, const std::function<void(int)>& on_signal) {

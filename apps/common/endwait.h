@@ -6,19 +6,23 @@
 #ifndef EVWATCH_APPS_COMMON_ENDWAIT_H_
 #define EVWATCH_APPS_COMMON_ENDWAIT_H_
 
+#include <chrono>
 #include <functional>
 #include <optional>
 
 namespace evwatch {
 
-enum class EndReason { kSignal, kDuration, kFailed };
+enum class EndReason { kSignal, kDuration, kFailed, kReload };
 
-// Blocks SIGINT and SIGTERM for WaitForEnd() to take, and ignores SIGPIPE so that a closed
-// output is a failed write instead of a silent death.
-void BlockEndSignals();
+// Blocks SIGINT and SIGTERM (and SIGHUP when `reload`) for WaitForEnd() to take, and ignores
+// SIGPIPE so that a closed output is a failed write instead of a silent death.
+void BlockEndSignals(bool reload = false);
 
-// Returns at SIGINT or SIGTERM, after `seconds` (never when nullopt), or once `failed()`
-// holds (checked a few times a second).
+// Returns at SIGINT or SIGTERM, at SIGHUP when BlockEndSignals took it (kReload), at
+// `deadline` (never when nullopt), or once `failed()` holds (checked a few times a second).
+using EndClock = std::chrono::steady_clock;
+EndReason WaitForEnd(std::optional<EndClock::time_point> deadline, const std::function<bool()>& failed);
+// The same with the deadline `seconds` from now.
 EndReason WaitForEnd(std::optional<double> seconds, const std::function<bool()>& failed);
 
 // Runs work() (a stop in progress). A SIGINT or SIGTERM meanwhile calls on_signal(signal) and

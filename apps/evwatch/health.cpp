@@ -12,10 +12,27 @@ std::string Address(const std::string& host, int port) { return host + ":" + std
 
 CameraHealth::CameraHealth(const Config& config, std::ostream& log, Clock now)
     : now_(now ? std::move(now) : [] { return std::chrono::steady_clock::now(); }), log_(log) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  Build(config);
+}
+
+void CameraHealth::Update(const Config& config) {
+  std::lock_guard<std::mutex> lock(mutex_);
+  Build(config);
+}
+
+void CameraHealth::Build(const Config& config) {
+  std::vector<State> before;
+  before.swap(cameras_);
+  by_address_.clear();
   for (const CameraConfig& c : config.cameras) {
     State state;
+    for (const State& old : before) {
+      if (old.name == c.name) state = old;
+    }
     state.name = c.name;
     state.address = Address(c.record.host, c.record.port);
+    state.detectors.clear();
     for (const DetectorConfig& d : c.detectors) {
       state.detectors += (state.detectors.empty() ? "" : ", ") + d.name;
     }

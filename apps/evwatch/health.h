@@ -33,6 +33,9 @@ class CameraHealth {
   // REQUIRES: log outlives the object. `now` replaces the clock in tests.
   CameraHealth(const Config& config, std::ostream& log, Clock now = nullptr);
 
+  // Follows a reloaded configuration: cameras that stay keep their state.
+  void Update(const Config& config);
+
   void OnTransfer(const TransferOutcome& outcome);
   // Whether the camera's last request failed.
   bool Failing(const std::string& camera) const;
@@ -51,6 +54,9 @@ class CameraHealth {
     std::string said_cause;
     std::chrono::steady_clock::time_point said_at;
   };
+
+  // Builds cameras_ and by_address_ from the configuration; REQUIRES mutex_ held.
+  void Build(const Config& config);
 
   Clock now_;
   std::ostream& log_;

@@ -53,6 +53,21 @@ void StopRunner(evwatch::Runner& runner, evwatch::EndReason end) {
   evwatch::RunUnlessSignalled([&runner] { runner.Stop(); }, [](int) { std::cout << std::flush; });
 }
 
+// SIGHUP: reads the file again; a file that does not pass the checks changes nothing.
+void Reload(const std::string& file, evwatch::Runner& runner, evwatch::CameraHealth& health) {
+  std::optional<evwatch::Config> next = Load(file);
+  if (!next) {
+    std::cerr << "evwatch: reload: the file has errors; everything keeps running as it was" << std::endl;
+    return;
+  }
+  health.Update(*next);
+  std::string error;
+  const evwatch::Runner::Change change = runner.Apply(std::move(*next), &error);
+  std::cerr << "evwatch: reloaded " << file << ": " << change.kept << " detectors kept, " << change.stopped
+            << " stopped, " << change.started << " started" << std::endl;
+  if (!change.ok) std::cerr << "evwatch: reload: " << error << std::endl;
+}
+
 int Run(const std::string& file, bool every, std::optional<double> seconds, const std::string& format) {
   std::optional<evwatch::Config> config = Load(file);
   if (!config) return kExitUsage;
@@ -65,13 +80,21 @@ int Run(const std::string& file, bool every, std::optional<double> seconds, cons
   struct ObserverEnd {
     ~ObserverEnd() { SetTransferObserver(nullptr); }
   } observer_end;
-  evwatch::Runner runner(std::move(*config), sink, std::cerr);
+  evwatch::Runner runner(*config, sink, std::cerr);
   std::string error;
   if (!runner.Start(&error)) {
     std::cerr << "evwatch: " << error << std::endl;
     return kExitFailure;
   }
-  evwatch::EndReason end = evwatch::WaitForEnd(seconds, [&sink] { return sink.Failed(); });
+  std::optional<evwatch::EndClock::time_point> deadline;
+  if (seconds) {
+    deadline = evwatch::EndClock::now() +
+               std::chrono::duration_cast<evwatch::EndClock::duration>(std::chrono::duration<double>(*seconds));
+  }
+  evwatch::EndReason end;
+  while ((end = evwatch::WaitForEnd(deadline, [&sink] { return sink.Failed(); })) == evwatch::EndReason::kReload) {
+    Reload(file, runner, health);
+  }
   StopRunner(runner, end);
   if (end == evwatch::EndReason::kFailed) {
     std::cerr << "evwatch: cannot write the output any more; stopped" << std::endl;
@@ -174,7 +197,7 @@ std::string CheckSeconds(std::string& text) {
 }  // namespace
 
 int main(int argc, char** argv) {
-  evwatch::BlockEndSignals();
+  evwatch::BlockEndSignals(/*reload=*/true);
 
   CLI::App app{"evwatch: camera event detectors, run from a configuration file"};
   app.require_subcommand(1);

@@ -34,28 +34,45 @@ class Runner {
   // Idempotent.
   void Stop();
 
-  size_t DetectorCount() const { return detectors_.size(); }
+  size_t DetectorCount() const;
+
+  // What a reload did: detectors kept running, stopped, and started; ok false when a start
+  // failed (*error then says which; what did start keeps running).
+  struct Change {
+    size_t kept = 0;
+    size_t stopped = 0;
+    size_t started = 0;
+    bool ok = true;
+  };
+  // Moves to `next`: detectors of removed or changed cameras and changed or removed detector
+  // entries stop; new and changed ones start; the others keep running, untouched. A camera is
+  // changed when anything but its detector list differs; a detector when its class, its
+  // constructor values or its interval do.
+  Change Apply(Config next, std::string* error);
 
   // The longest a Stop() waits: the longest network time-out of a detector's request (the
   // pacing timers are woken).
   static constexpr int kLongestStopSeconds = 30;
 
- private:
+  // Defined in runner.cpp; named here for its file-local helpers.
   struct CameraUnit;
   struct DetectorUnit;
 
+ private:
+  // Starts the cameras (receivers first, all at once) and then their detectors.
+  bool StartCameras(const std::vector<CameraConfig>& configs, std::vector<CameraUnit*>* started,
+                    std::string* error);
   // Makes the camera's objects and starts its frame receiver, if it has a frames: source.
-  bool StartCamera(const CameraConfig& config, std::string* error);
+  CameraUnit* StartCamera(const CameraConfig& config, std::string* error);
   // Waits, for all receivers at once, until each has a frame or a short while has passed.
-  void WaitForFirstFrames();
-  bool StartDetectors(const CameraConfig& config, CameraUnit* camera, std::string* error);
+  void WaitForFirstFrames(const std::vector<CameraUnit*>& cameras);
+  bool StartDetector(const DetectorConfig& config, CameraUnit* camera, std::string* error);
 
-  const Config config_;
+  Config config_;
   Sink& sink_;
   std::ostream& log_;
+  // Each camera owns its detectors, which go before its records and receiver.
   std::vector<std::unique_ptr<CameraUnit>> cameras_;
-  // Destroyed before cameras_: a detector uses its camera's objects until it is deleted.
-  std::vector<std::unique_ptr<DetectorUnit>> detectors_;
 };
 
 }  // namespace evwatch
