@@ -32,8 +32,9 @@ all: build
 deps:
 	@scripts/install-deps.sh
 
+# A sanitizer build is for the suite: it leaves the benchmarks out (make bench builds them).
 configure: deps
-	@cmake -S . -B $(BUILD) -DEVW_SANITIZE=$(SAN) >/dev/null
+	@cmake -S . -B $(BUILD) -DEVW_SANITIZE=$(SAN) $(if $(SAN),-DEVW_BUILD_BENCH=OFF) >/dev/null
 
 build: configure
 	@cmake --build $(BUILD) -j $(JOBS)
@@ -50,7 +51,7 @@ demo: configure
 bench: build
 	@scripts/install-deps.sh libopencv-core-dev libopencv-imgproc-dev libopencv-imgcodecs-dev || \
 	  echo "make bench: no OpenCV; the motion benchmark runs without its OpenCV columns" >&2
-	@cmake -S . -B $(BUILD) -DEVW_SANITIZE=$(SAN) >/dev/null
+	@cmake -S . -B $(BUILD) -DEVW_SANITIZE=$(SAN) -DEVW_BUILD_BENCH=ON >/dev/null
 	@cmake --build $(BUILD) -j $(JOBS) --target bench_all
 	@scripts/run-bench.sh $(BUILD)
 
