@@ -6,6 +6,7 @@
 #include <cstring>
 
 #include "host/text/strutil.h"
+#include "host/transport/headerlines.h"
 #include "host/transport/transfernote.h"
 
 namespace {
@@ -253,8 +254,7 @@ size_t HttpPull::OnHeader(const char* data, size_t size) {
   header_bytes_ += size;
   if (header_bytes_ > kMaxHeaderBytes) return 0;
   if (headers_in_) return size;  // trailers of a chunked body
-  std::string_view line(data, size);
-  while (!line.empty() && (line.back() == '\n' || line.back() == '\r')) line.remove_suffix(1);
+  const std::string_view line = HeaderLineText(data, size);
   try {
     if (line.substr(0, 5) == "HTTP/") {
       status_ = ParseStatus(line);
@@ -267,14 +267,8 @@ size_t HttpPull::OnHeader(const char* data, size_t size) {
         block_ended_ = true;
         if (status_ != 401 || target_.user.empty()) headers_in_ = true;
       }
-    } else if (line.front() == ' ' || line.front() == '\t') {
-      if (!headers_.empty()) headers_.back().second += " " + std::string(TrimBlanks(line));
     } else {
-      size_t colon = line.find(':');
-      if (colon != std::string_view::npos) {
-        headers_.emplace_back(std::string(TrimBlanks(line.substr(0, colon))),
-                              std::string(TrimBlanks(line.substr(colon + 1))));
-      }
+      AddHeaderLine(line, &headers_);
     }
   } catch (...) {
     return 0;

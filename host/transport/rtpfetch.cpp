@@ -11,6 +11,7 @@
 #include <utility>
 
 #include "host/text/strutil.h"
+#include "host/transport/headerlines.h"
 #include "host/transport/httppull.h"
 
 namespace {
@@ -418,18 +419,13 @@ size_t RtspSession::OnBody(const char* data, size_t size) {
 size_t RtspSession::OnHeader(const char* data, size_t size) {
   header_bytes_ += size;
   if (header_bytes_ > kMaxHeaders) return 0;
-  std::string_view line(data, size);
-  while (!line.empty() && (line.back() == '\n' || line.back() == '\r')) line.remove_suffix(1);
+  const std::string_view line = HeaderLineText(data, size);
   try {
     if (line.substr(0, 5) == "RTSP/") {
       headers_.clear();  // a new response (after a challenge) replaces the last one's
       return size;
     }
-    size_t colon = line.find(':');
-    if (colon != std::string_view::npos) {
-      headers_.emplace_back(std::string(TrimBlanks(line.substr(0, colon))),
-                            std::string(TrimBlanks(line.substr(colon + 1))));
-    }
+    AddHeaderLine(line, &headers_);
   } catch (...) {
     return 0;
   }
