@@ -146,7 +146,8 @@ TEST_F(PolledEmulationTest, LevelOneCamerasEachGetTheirOwnAddress) {
   EXPECT_EQ(hosts.size(), 3u);
   EXPECT_EQ(hosts.count(""), 0u);
   // Each describes its address, for clients to find it.
-  for (const auto& c : sim_.Describe()["cameras"]) EXPECT_TRUE(c.contains("host")) << c.dump();
+  const nlohmann::json described = sim_.Describe();
+  for (const auto& c : described["cameras"]) EXPECT_TRUE(c.contains("host")) << c.dump();
 
   // Another simulator cannot take an address already held.
   Simulator other;
