@@ -64,12 +64,16 @@ grep -q '^ExecReload' "$unit" && fail "the unit has an ExecReload, and evwatch d
 ok "unit runs $prefix/$bindir/evwatch run -c /etc/evwatch/evwatch.yaml"
 
 echo "== installed programs"
-runpath=$(readelf -d "$prefix/$bindir/evwatch" | sed -n 's/.*(RUNPATH).*\[\(.*\)\]/\1/p')
-[[ "$runpath" == *'$ORIGIN/'* ]] || fail "evwatch's RUNPATH is '$runpath', no \$ORIGIN"
+for program in evwatch camsim; do
+  runpath=$(readelf -d "$prefix/$bindir/$program" | sed -n 's/.*(RUNPATH).*\[\(.*\)\]/\1/p')
+  [[ "$runpath" == '$ORIGIN/'* ]] || fail "$program's RUNPATH is '$runpath', not \$ORIGIN/..."
+  # An empty entry would make the loader search the current folder.
+  [[ "$runpath" == *: || "$runpath" == *::* ]] && fail "$program's RUNPATH '$runpath' has an empty entry"
+done
 resolved=$(env -u LD_LIBRARY_PATH ldd "$prefix/$bindir/evwatch" | awk '/libeventdetector/ {print $3}')
 [ -n "$resolved" ] && [ "$(readlink -f "$resolved")" = "$(readlink -f "$prefix/$libdir/libeventdetector.so.0")" ] \
   || fail "installed evwatch loads libeventdetector from '$resolved'"
-ok "evwatch RUNPATH $runpath loads $resolved"
+ok "RUNPATH $runpath (evwatch, camsim); evwatch loads $resolved"
 version=$(env -u LD_LIBRARY_PATH "$prefix/$bindir/evwatch" --version)
 [[ "$version" == "evwatch "* ]] || fail "evwatch --version said '$version'"
 ok "$version"
