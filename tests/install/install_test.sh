@@ -87,8 +87,10 @@ if command -v man >/dev/null 2>&1; then
   done
   ok "man pages format without warnings"
 fi
-# The demo must run the camsim installed beside evwatch: none on this PATH, none named.
-demo=$(cd "$tmp" && env -u EVWATCH_CAMSIM PATH=/usr/bin:/bin "$prefix/$bindir/evwatch" demo --duration 3 2>&1) \
+# The demo must run the camsim installed beside evwatch: the PATH is an empty folder and
+# EVWATCH_CAMSIM is unset.
+mkdir "$tmp/empty-path"
+demo=$(cd "$tmp" && env -u EVWATCH_CAMSIM PATH="$tmp/empty-path" "$prefix/$bindir/evwatch" demo --duration 3 2>&1) \
   || { echo "$demo"; fail "evwatch demo"; }
 summary=$(echo "$demo" | grep -E '^demo: [0-9]+ events from [0-9]+ cameras' || true)
 [ -n "$summary" ] || { echo "$demo" | tail -5; fail "evwatch demo printed no summary"; }
