@@ -27,8 +27,9 @@ install(DIRECTORY ${CMAKE_SOURCE_DIR}/framework ${CMAKE_SOURCE_DIR}/detectors
         DESTINATION ${EVW_INSTALL_INCLUDEDIR}
         FILES_MATCHING PATTERN "*.h")
 
-# libeventdetector's exported target keeps its INTERFACE link to evwatch::evhost: a program
-# that links the detectors gets our host unless it brings its own.
+# libeventdetector's exported target keeps its INTERFACE link to evwatch::evhost, as in the
+# tree: a program that links evwatch::eventdetector gets our host with it, while the library
+# file itself links no host (a recorder with its own links -leventdetector alone).
 install(EXPORT evwatchTargets NAMESPACE evwatch:: DESTINATION ${EVW_CMAKE_PACKAGE_DIR})
 configure_package_config_file(${CMAKE_SOURCE_DIR}/cmake/evwatchConfig.cmake.in
                               ${CMAKE_BINARY_DIR}/evwatchConfig.cmake
