@@ -25,7 +25,7 @@ else
   SAN := address
 endif
 
-.PHONY: all deps configure build test demo bench lib clean
+.PHONY: all deps configure build test demo bench lib install clean
 
 all: build
 
@@ -58,6 +58,14 @@ bench: build
 lib: deps
 	@cmake -S . -B build-lib -DEVW_LIBRARY_ONLY=ON >/dev/null
 	@cmake --build build-lib -j $(JOBS) --target eventdetector evhost
+
+# The prefix is given at configure time as well: the library folder (lib/<arch> for /usr)
+# and the paths in the installed files follow it. Installs from the plain build only.
+PREFIX ?= /usr/local
+install: deps
+	@cmake -S . -B build -DEVW_SANITIZE= -DCMAKE_INSTALL_PREFIX=$(PREFIX) >/dev/null
+	@cmake --build build -j $(JOBS) --target eventdetector evhost evwatch camsim
+	@DESTDIR="$(DESTDIR)" cmake --install build
 
 clean:
 	rm -rf build build-asan build-tsan build-lib
