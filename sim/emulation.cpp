@@ -25,6 +25,7 @@ Emulation LevelOneEmulation();
 Emulation MessoaEmulation();
 Emulation MessoaProEmulation();
 Emulation MobotixEmulation();
+Emulation OnvifEmulation();
 Emulation PanasonicEmulation();
 Emulation PixordEmulation();
 Emulation PsiaEmulation();
@@ -57,6 +58,7 @@ const std::vector<Emulation>& Emulations() {
       MessoaEmulation(),
       MessoaProEmulation(),
       MobotixEmulation(),
+      OnvifEmulation(),
       PanasonicEmulation(),
       PixordEmulation(),
       PsiaEmulation(),
