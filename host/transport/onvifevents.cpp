@@ -305,6 +305,30 @@ void ParseNotifications(const XmlDoc& answer, std::vector<OnvifEvent>& events) {
   }
 }
 
+// The element children of a ReferenceParameters, serialized with the namespace declarations
+// they use (which the camera may have made on an ancestor).
+std::string ReferenceHeaders(xmlNodePtr parameters) {
+  std::string out;
+  if (!parameters) return out;
+  for (xmlNodePtr c = parameters->children; c; c = c->next) {
+    if (c->type != XML_ELEMENT_NODE) continue;
+    xmlDocPtr holder = xmlNewDoc(reinterpret_cast<const xmlChar*>("1.0"));
+    xmlNodePtr copy = xmlDocCopyNode(c, holder, 1);
+    if (copy) {
+      xmlDocSetRootElement(holder, copy);
+      xmlReconciliateNs(holder, copy);
+      xmlBufferPtr buffer = xmlBufferCreate();
+      if (buffer && xmlNodeDump(buffer, holder, copy, 0, 0) > 0) {
+        out.append(reinterpret_cast<const char*>(xmlBufferContent(buffer)),
+                   static_cast<size_t>(xmlBufferLength(buffer)));
+      }
+      if (buffer) xmlBufferFree(buffer);
+    }
+    xmlFreeDoc(holder);
+  }
+  return out;
+}
+
 }  // namespace
 
 struct OnvifEventClient::Impl {
@@ -319,6 +343,8 @@ struct OnvifEventClient::Impl {
   int64_t clock_offset = 0;           // camera's clock minus ours, seconds
   std::string event_path;             // found once, kept across resubscriptions
   std::string subscription_path;      // empty: not subscribed
+  std::string subscription_address;   // as the camera named it, for wsa:To
+  std::string reference_headers;      // its ReferenceParameters, echoed as header blocks
   int lifetime = 0;                   // seconds a subscription lives from a renewal
   std::chrono::steady_clock::time_point renew_at;
   std::string last_error;
@@ -390,8 +416,9 @@ struct OnvifEventClient::Impl {
   }
 
   std::string Envelope(const std::string& action, const std::string& to, const std::string& body,
-                       bool secure) const {
+                       bool secure, const std::string& references = "") const {
     std::string header = secure ? SecurityHeader() : "";
+    header += references;
     header += "<wsa:Action>" + std::string(action) + "</wsa:Action>";
     if (!to.empty()) header += "<wsa:To>" + XmlEscape(to) + "</wsa:To>";
     return std::string("<?xml version=\"1.0\" encoding=\"UTF-8\"?><s:Envelope xmlns:s=\"") +
@@ -457,7 +484,11 @@ struct OnvifEventClient::Impl {
                                const std::string& body, bool secure, int timeout = 0,
                                bool interruptible = false) {
     Answer answer;
-    std::string envelope = Envelope(action, "", body, secure);
+    // Calls to the subscription carry its address and reference parameters: cameras that
+    // serve every pull point at one path tell them apart by these.
+    bool to_subscription = !subscription_path.empty() && path == subscription_path;
+    std::string envelope = Envelope(action, to_subscription ? subscription_address : "",
+                                    body, secure, to_subscription ? reference_headers : "");
     if (!Post(path, action, envelope, timeout > 0 ? timeout : settings.io_timeout, interruptible,
               answer)) {
       last_error = std::string(what) + ": " + last_error;
@@ -594,6 +625,8 @@ int OnvifEventClient::Subscribe() {
   std::string address = Text(Child(reference, kAddressingNs, "Address"));
   // A camera that names no address serves the pull point at the event service itself.
   d.subscription_path = address.empty() ? d.event_path : PathOf(address);
+  d.subscription_address = address;
+  d.reference_headers = ReferenceHeaders(Child(reference, kAddressingNs, "ReferenceParameters"));
   d.ScheduleRenewal(*doc);
   d.last_error.clear();
   return 0;

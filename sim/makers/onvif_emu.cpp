@@ -356,17 +356,36 @@ void OnvifDevice::Handle(HttpConnection& connection) {
       ++counts_[operation];
     }
     time_t now = std::time(nullptr) + static_cast<time_t>(options_.clock_offset);
-    Answer(connection, open + "<tev:CreatePullPointSubscriptionResponse><tev:SubscriptionReference>"
-                           "<wsa:Address>" + base + "/onvif/subscription/" + std::to_string(id) +
-                           "</wsa:Address></tev:SubscriptionReference><wsnt:CurrentTime>" +
+    std::string reference =
+        options_.reference_parameters
+            ? "<wsa:Address>" + base + kPullPointPath + "</wsa:Address><wsa:ReferenceParameters>"
+              "<sid:SubscriptionId xmlns:sid=\"urn:example:subscription\">" + std::to_string(id) +
+              "</sid:SubscriptionId></wsa:ReferenceParameters>"
+            : "<wsa:Address>" + base + "/onvif/subscription/" + std::to_string(id) + "</wsa:Address>";
+    Answer(connection, open + "<tev:CreatePullPointSubscriptionResponse><tev:SubscriptionReference>" +
+                           reference + "</tev:SubscriptionReference><wsnt:CurrentTime>" +
                            UtcText(now) + "</wsnt:CurrentTime><wsnt:TerminationTime>" +
                            UtcText(now + seconds) + "</wsnt:TerminationTime>"
                            "</tev:CreatePullPointSubscriptionResponse>" + close);
     return;
   }
   const std::string prefix = "/onvif/subscription/";
-  if (path.compare(0, prefix.size(), prefix) == 0) {
-    int id = std::atoi(path.c_str() + prefix.size());
+  bool by_reference = options_.reference_parameters && path == kPullPointPath;
+  if (by_reference || path.compare(0, prefix.size(), prefix) == 0) {
+    // A subscription named by reference parameter must find it in the header.
+    xmlNodePtr header = request.Find("Header");
+    xmlNodePtr sid = header ? Request::FindIn(header->children, "SubscriptionId") : nullptr;
+    int id = 0;
+    if (by_reference) {
+      if (sid && sid->ns && std::strcmp(reinterpret_cast<const char*>(sid->ns->href),
+                                        "urn:example:subscription") == 0) {
+        xmlChar* content = xmlNodeGetContent(sid);
+        id = content ? std::atoi(reinterpret_cast<const char*>(content)) : 0;
+        xmlFree(content);
+      }
+    } else {
+      id = std::atoi(path.c_str() + prefix.size());
+    }
     if (operation == "PullMessages") {
       PullMessages(connection, id, body);
       return;

@@ -38,12 +38,16 @@ struct OnvifDeviceOptions {
   // decoy message whose "tns1" prefix names another namespace.
   bool unusual_prefixes = false;
   std::string padding;         // written into every PullMessagesResponse (large answers)
+  // Serve every subscription at one path, told apart by a reference parameter that the
+  // client must echo in its header.
+  bool reference_parameters = false;
 };
 
 class OnvifDevice {
  public:
   static constexpr char kDevicePath[] = "/onvif/device_service";
   static constexpr char kEventPath[] = "/onvif/event_service";
+  static constexpr char kPullPointPath[] = "/onvif/pullpoint";
 
   // REQUIRES: state outlives the device.
   OnvifDevice(OnvifDeviceOptions options, CameraState* state);

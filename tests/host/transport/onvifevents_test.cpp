@@ -199,6 +199,29 @@ TEST_F(OnvifClientTest, CameraClockAnHourBehindStillAcceptsTheToken) {
   EXPECT_EQ(device_->Refused(), 0);
 }
 
+TEST_F(OnvifClientTest, EchoesReferenceParametersToTheSubscription) {
+  evsim::OnvifDeviceOptions options;
+  options.reference_parameters = true;
+  StartDevice(options);
+  state_.SetInput(2, true);
+  OnvifEventClient client(Settings());
+  ASSERT_EQ(client.Subscribe(), 0) << client.LastError();
+  ASSERT_EQ(client.Subscribe(), 0) << client.LastError();  // a second subscription, id 2
+  std::vector<OnvifEvent> events;
+  ASSERT_EQ(client.Pull(events), 0) << client.LastError();
+  const OnvifEvent* in2 = FindEvent(events, OnvifEvent::Topic::kDigitalInput, "DigitalInput_2");
+  ASSERT_NE(in2, nullptr);
+  EXPECT_TRUE(in2->state);
+  std::vector<std::string> bodies = device_->Bodies();
+  ASSERT_FALSE(bodies.empty());
+  EXPECT_NE(bodies.back().find("urn:example:subscription"), std::string::npos);
+  EXPECT_NE(bodies.back().find(">2</"), std::string::npos);
+  EXPECT_NE(bodies.back().find("/onvif/pullpoint</wsa:To>"), std::string::npos);
+  client.Unsubscribe();
+  EXPECT_EQ(device_->Count("Unsubscribe"), 1);
+  EXPECT_EQ(device_->LiveSubscriptions(), 1);  // the first one, forgotten by the client
+}
+
 TEST_F(OnvifClientTest, FindsTheEventServiceThroughGetServices) {
   evsim::OnvifDeviceOptions options;
   options.capabilities = false;
