@@ -5,12 +5,14 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <mutex>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include "sim/camstate.h"
 #include "sim/makers/onvif_emu.h"
+#include "sim/net/httpauth.h"
 #include "sim/net/httpserver.h"
 
 namespace {
@@ -279,6 +281,43 @@ TEST_F(OnvifClientTest, AnswerOverTheBoundFails) {
   EXPECT_EQ(client.Pull(events), -1);
   EXPECT_TRUE(events.empty());
   EXPECT_NE(client.LastError().find("longer than"), std::string::npos) << client.LastError();
+}
+
+TEST(OnvifClientHttpAuth, AnswersADigestChallengeBesideTheToken) {
+  evsim::CameraState state;
+  state.SetInput(1, true);
+  evsim::OnvifDeviceOptions options;
+  options.user = kUser;
+  options.password = kPassword;
+  evsim::OnvifDevice device(options, &state);
+  evsim::HttpAuth auth(evsim::AuthScheme::kDigest, kUser, kPassword);
+  int challenged = 0;
+  std::mutex mutex;
+  evsim::HttpServer server([&](evsim::HttpConnection& c) {
+    if (!auth.Accepts(c.Request())) {
+      std::lock_guard<std::mutex> lock(mutex);
+      ++challenged;
+      c.Write(auth.Challenge());
+      return;
+    }
+    device.Handle(c);
+  });
+  OnvifSettings s;
+  s.host = "127.0.0.1";
+  s.port = server.Port();
+  s.user = kUser;
+  s.password = kPassword;
+  s.pull_timeout = 1;
+  OnvifEventClient client(s);
+  ASSERT_EQ(client.Subscribe(), 0) << client.LastError();
+  std::vector<OnvifEvent> events;
+  ASSERT_EQ(client.Pull(events), 0) << client.LastError();
+  const OnvifEvent* in1 = FindEvent(events, OnvifEvent::Topic::kDigitalInput, "DigitalInput_1");
+  ASSERT_NE(in1, nullptr);
+  EXPECT_TRUE(in1->state);
+  std::lock_guard<std::mutex> lock(mutex);
+  EXPECT_GE(challenged, 1);
+  server.Stop();
 }
 
 TEST(OnvifClientGarbage, GarbageAnswersFailCleanly) {
