@@ -613,7 +613,10 @@ OnvifEventClient::~OnvifEventClient() = default;
 int OnvifEventClient::Subscribe() {
   Impl& d = *impl_;
   d.subscription_path.clear();
-  if (!d.ReadClock() || !d.FindEventService()) return -1;
+  // A camera that will not tell its time may still take a token signed with ours; if it
+  // does not, the next call says so.
+  d.ReadClock();
+  if (!d.FindEventService()) return -1;
   auto doc = d.Call("CreatePullPointSubscription", d.event_path,
                     std::string(kEventNs) + "/EventPortType/CreatePullPointSubscriptionRequest",
                     "<tev:CreatePullPointSubscription><tev:InitialTerminationTime>PT" +

@@ -171,7 +171,9 @@ std::vector<std::pair<std::string, bool>> OnvifDevice::Properties() const {
   CameraStatus status = state_->Get();
   std::vector<std::pair<std::string, bool>> out;
   if (options_.cell_motion) out.push_back({"cell", status.motion > 0});
+  if (options_.cell_motion && options_.second_source) out.push_back({"cell2", status.motion == 0});
   if (options_.motion_alarm) out.push_back({"alarm", status.motion > 0});
+  if (options_.motion_alarm && options_.second_source) out.push_back({"alarm2", status.motion == 0});
   for (int n = 1; n <= options_.inputs && n <= kInputCount; ++n) {
     out.push_back({"input" + std::to_string(n), status.Input(n)});
   }
@@ -182,13 +184,14 @@ std::string OnvifDevice::Notification(const std::string& property, bool state,
                                       bool initialized) const {
   std::string topic, source, data;
   std::string value = state ? "true" : "false";
-  if (property == "cell") {
+  const std::string number = property.back() == '2' ? "2" : "1";
+  if (property.compare(0, 4, "cell") == 0) {
     topic = "RuleEngine/CellMotionDetector/Motion";
-    source = "VideoSourceConfigurationToken\" Value=\"VideoSourceConfig_1";
+    source = "VideoSourceConfigurationToken\" Value=\"VideoSourceConfig_" + number;
     data = "IsMotion";
-  } else if (property == "alarm") {
+  } else if (property.compare(0, 5, "alarm") == 0) {
     topic = "VideoSource/MotionAlarm";
-    source = "Source\" Value=\"VideoSource_1";
+    source = "Source\" Value=\"VideoSource_" + number;
     data = "State";
   } else {
     topic = "Device/Trigger/DigitalInput";
@@ -274,6 +277,8 @@ void OnvifDevice::Handle(HttpConnection& connection) {
   const std::string& body = http.body;
   {
     std::lock_guard<std::mutex> lock(mutex_);
+    // Tests look at the latest calls; a long camsim run keeps no more than these.
+    if (bodies_.size() >= kKeptBodies) bodies_.erase(bodies_.begin());
     bodies_.push_back(body);
   }
   std::string path = http.Path();
@@ -448,12 +453,21 @@ namespace {
 // camsim's ONVIF cameras: one device per simulated camera, made on its first request.
 void HandleOnvif(HttpConnection& connection, CameraState& state, const Login& login) {
   static std::mutex mutex;
-  static std::map<CameraState*, std::unique_ptr<OnvifDevice>> devices;
-  OnvifDevice* device;
+  // A camera's state may be freed and another made at its address (simulators run one after
+  // another in one process): a new login makes a new device, and a connection still served
+  // by the old one keeps it alive until it ends.
+  struct Slot {
+    std::shared_ptr<OnvifDevice> device;
+    Login login;
+  };
+  static std::map<CameraState*, Slot> devices;
+  std::shared_ptr<OnvifDevice> device;
   {
     std::lock_guard<std::mutex> lock(mutex);
-    auto& slot = devices[&state];
-    if (!slot) {
+    Slot& slot = devices[&state];
+    if (!slot.device || slot.login.required != login.required || slot.login.user != login.user ||
+        slot.login.password != login.password) {
+      slot.login = login;
       OnvifDeviceOptions options;
       if (login.required) {
         options.user = login.user;
@@ -461,9 +475,9 @@ void HandleOnvif(HttpConnection& connection, CameraState& state, const Login& lo
       }
       options.cell_motion = true;
       options.inputs = 4;
-      slot = std::make_unique<OnvifDevice>(options, &state);
+      slot.device = std::make_shared<OnvifDevice>(options, &state);
     }
-    device = slot.get();
+    device = slot.device;
   }
   device->Handle(connection);
 }

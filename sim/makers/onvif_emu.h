@@ -15,6 +15,7 @@
 #define EVWATCH_SIM_MAKERS_ONVIF_EMU_H_
 
 #include <chrono>
+#include <cstddef>
 #include <cstdint>
 #include <map>
 #include <mutex>
@@ -33,6 +34,9 @@ struct OnvifDeviceOptions {
   bool cell_motion = true;     // announce RuleEngine/CellMotionDetector/Motion
   bool motion_alarm = false;   // announce VideoSource/MotionAlarm
   int inputs = 2;              // digital inputs announced
+  // A second video source whose motion is always the opposite of the first's (a camera with
+  // two sensors), to show which source a reading follows.
+  bool second_source = false;
   bool capabilities = true;    // false: GetCapabilities fails (GetServices must be used)
   // Write answers with unusual namespace prefixes, declared deep in the message, and add a
   // decoy message whose "tns1" prefix names another namespace.
@@ -48,6 +52,7 @@ class OnvifDevice {
   static constexpr char kDevicePath[] = "/onvif/device_service";
   static constexpr char kEventPath[] = "/onvif/event_service";
   static constexpr char kPullPointPath[] = "/onvif/pullpoint";
+  static constexpr size_t kKeptBodies = 256;
 
   // REQUIRES: state outlives the device.
   OnvifDevice(OnvifDeviceOptions options, CameraState* state);
@@ -63,7 +68,7 @@ class OnvifDevice {
   int Count(const std::string& operation) const;
   int Refused() const;
   int LiveSubscriptions() const;
-  // Every request body seen, in order.
+  // The latest request bodies seen (at most kKeptBodies), in order.
   std::vector<std::string> Bodies() const;
 
  private:
@@ -86,7 +91,7 @@ class OnvifDevice {
   int next_id_ = 1;                             // guarded by mutex_
   std::map<std::string, int> counts_;           // guarded by mutex_
   int refused_ = 0;                             // guarded by mutex_
-  std::vector<std::string> bodies_;             // guarded by mutex_
+  std::vector<std::string> bodies_;             // guarded by mutex_; the latest kKeptBodies
 };
 
 }  // namespace evsim

@@ -31,8 +31,10 @@ class OnvifDetectorTest : public ::testing::Test {
         [this](evsim::HttpConnection& c) { device_->Handle(c); });
     ASSERT_GT(server_->Port(), 0);
   }
-  std::unique_ptr<Camera> MakeCamera(const std::string& password = kPassword) const {
+  std::unique_ptr<Camera> MakeCamera(const std::string& password = kPassword,
+                                     const std::string& channel = "1") const {
     CameraRecord record;
+    record.channel = channel;
     record.host = "127.0.0.1";
     record.port = server_->Port();
     record.username = kUser;
@@ -78,6 +80,31 @@ TEST_F(OnvifDetectorTest, MotionFromTheVideoSourceAlarmTopic) {
   bool motion = false;
   unsigned int level = 0;
   ASSERT_EQ(md.DoMD(motion, level), 0) << md.LastError();
+  EXPECT_TRUE(motion);
+  EXPECT_EQ(level, 100u);
+}
+
+TEST_F(OnvifDetectorTest, MotionFollowsTheChannelsVideoSourceOnly) {
+  evsim::OnvifDeviceOptions options;
+  options.second_source = true;
+  options.motion_alarm = true;
+  StartDevice(options);
+  state_.SetMotion(40);  // source 1 moves, source 2 says the opposite
+  auto first = MakeCamera(kPassword, "1");
+  auto second = MakeCamera(kPassword, "2");
+  OnvifMD md1(first.get());
+  OnvifMD md2(second.get());
+  md1.SetPullTimeout(2);
+  bool motion = false;
+  unsigned int level = 0;
+  ASSERT_EQ(md1.DoMD(motion, level), 0) << md1.LastError();
+  EXPECT_TRUE(motion);
+  ASSERT_EQ(md2.DoMD(motion, level), 0) << md2.LastError();
+  EXPECT_FALSE(motion);
+  state_.SetMotion(0);
+  ASSERT_EQ(md1.DoMD(motion, level), 0) << md1.LastError();
+  EXPECT_FALSE(motion);
+  ASSERT_EQ(md2.DoMD(motion, level), 0) << md2.LastError();
   EXPECT_TRUE(motion);
   EXPECT_EQ(level, 100u);
 }
