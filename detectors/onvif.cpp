@@ -46,6 +46,11 @@ void OnvifDetector::SetPullTimeout(int seconds) {
   Reconnect();
 }
 
+void OnvifDetector::SetMessageLimit(int messages) {
+  settings_.message_limit = messages;
+  Reconnect();
+}
+
 void OnvifDetector::SetTermination(int seconds) {
   settings_.termination = seconds;
   Reconnect();

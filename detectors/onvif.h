@@ -34,10 +34,12 @@ class OnvifDetector : public DetectorBase {
   int EventDetecor() override;
 
   // Settings of the subscription, to be changed before Start: the event service's path
-  // (empty: ask the camera) and how long one PullMessages may wait, in seconds.
+  // (empty: ask the camera), how long one PullMessages may wait (seconds), how many messages
+  // it may bring, and how long a subscription lives unless renewed (seconds).
   // REQUIRES: not started.
   void SetEventPath(const std::string& path);
   void SetPullTimeout(int seconds);
+  void SetMessageLimit(int messages);
   void SetTermination(int seconds);
 
   // The client's last failure, for logs (never holds the password).

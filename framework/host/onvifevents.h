@@ -57,7 +57,8 @@ class OnvifEventClient {
   int Subscribe();
   // One PullMessages (renewing the subscription first when it is due). Appends what came
   // to events. 0 on success (no message is a success after the time-out); -1 on a failure,
-  // after which the subscription is dropped and Subscribe must be called again.
+  // after which the subscription is dropped and Subscribe must be called again, or on an
+  // Interrupt, which keeps the subscription (for Unsubscribe).
   int Pull(std::vector<OnvifEvent>& events);
   // Asks the camera to end the subscription (best effort) and forgets it.
   void Unsubscribe();

@@ -35,10 +35,12 @@ constexpr char kBase64Type[] =
     "http://docs.oasis-open.org/wss/2004/01/oasis-200401-wss-soap-message-security-1.0"
     "#Base64Binary";
 
-// libcurl's global set-up is not thread-safe; do it once, before any thread's first request.
-void InitCurlOnce() {
+// libcurl's and libxml2's global set-up is not thread-safe; do it once, before any thread's
+// first request.
+void InitLibrariesOnce() {
   static const bool done = [] {
     curl_global_init(CURL_GLOBAL_DEFAULT);
+    xmlInitParser();
     return true;
   }();
   (void)done;
@@ -432,7 +434,7 @@ struct OnvifEventClient::Impl {
   // answer over the bound (last_error says which).
   bool Post(const std::string& path, const std::string& action, const std::string& envelope,
             int timeout, bool interruptible, Answer& answer) {
-    InitCurlOnce();
+    InitLibrariesOnce();
     CURL* curl = curl_easy_init();
     if (!curl) {
       last_error = "cannot create an HTTP request";
@@ -660,7 +662,8 @@ int OnvifEventClient::Pull(std::vector<OnvifEvent>& events) {
                     true, wait + d.settings.io_timeout, true);
   if (!doc || !Find(doc->Root(), kEventNs, "PullMessagesResponse")) {
     if (doc) d.last_error = "PullMessages: not a PullMessagesResponse";
-    d.subscription_path.clear();
+    // An interrupted poll leaves the subscription as it was, for Unsubscribe to end it.
+    if (!d.interrupted.load()) d.subscription_path.clear();
     return -1;
   }
   ParseNotifications(*doc, events);

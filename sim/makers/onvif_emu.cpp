@@ -41,6 +41,11 @@ constexpr char kOddEnvelopeClose[] = "</e:Body></e:Envelope>";
 struct Request {
   xmlDocPtr doc = nullptr;
   explicit Request(const std::string& body) {
+    static const bool initialized = [] {
+      xmlInitParser();  // its global set-up is not thread-safe
+      return true;
+    }();
+    (void)initialized;
     doc = xmlReadMemory(body.data(), static_cast<int>(body.size()), "request.xml", nullptr,
                         XML_PARSE_NONET | XML_PARSE_NOERROR | XML_PARSE_NOWARNING);
   }

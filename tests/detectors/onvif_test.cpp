@@ -125,6 +125,24 @@ TEST_F(OnvifDetectorTest, InputReadingIgnoresOtherInputs) {
   EXPECT_TRUE(active);
 }
 
+TEST_F(OnvifDetectorTest, MessageLimitSpreadsTheInitialStatesOverPulls) {
+  StartDevice();
+  state_.SetInput(2, true);
+  auto camera = MakeCamera();
+  OnvifEID eid(camera.get(), 2);
+  eid.SetMessageLimit(1);
+  eid.SetPullTimeout(1);
+  // One message per pull: motion first, then input 1, then input 2.
+  bool active = true;
+  ASSERT_EQ(eid.DoEID(active), 0) << eid.LastError();
+  EXPECT_FALSE(active);
+  ASSERT_EQ(eid.DoEID(active), 0) << eid.LastError();
+  EXPECT_FALSE(active);
+  ASSERT_EQ(eid.DoEID(active), 0) << eid.LastError();
+  EXPECT_TRUE(active);
+  EXPECT_EQ(device_->Count("PullMessages"), 3);
+}
+
 TEST_F(OnvifDetectorTest, InitialInputStateIsReportedAtOnce) {
   StartDevice();
   state_.SetInput(1, true);

@@ -152,6 +152,30 @@ TEST_F(OnvifClientTest, UnsubscribeEndsTheSubscription) {
   EXPECT_EQ(device_->LiveSubscriptions(), 0);
 }
 
+TEST_F(OnvifClientTest, InterruptEndsAPollAndKeepsTheSubscription) {
+  StartDevice({});
+  OnvifSettings settings = Settings();
+  settings.pull_timeout = 60;
+  OnvifEventClient client(settings);
+  ASSERT_EQ(client.Subscribe(), 0);
+  std::vector<OnvifEvent> events;
+  ASSERT_EQ(client.Pull(events), 0);  // the initial states
+  std::thread stopper([&client] {
+    std::this_thread::sleep_for(std::chrono::milliseconds(200));
+    client.Interrupt();
+  });
+  EXPECT_EQ(client.Pull(events), -1);  // would wait a minute without the interrupt
+  stopper.join();
+  EXPECT_TRUE(client.Subscribed());
+  EXPECT_EQ(client.Pull(events), -1);  // still interrupted
+  EXPECT_FALSE(client.WaitInterruptible(60000));
+  client.Unsubscribe();
+  EXPECT_EQ(device_->Count("Unsubscribe"), 1);
+  EXPECT_EQ(device_->LiveSubscriptions(), 0);
+  client.ClearInterrupt();
+  EXPECT_FALSE(client.Interrupted());
+}
+
 TEST_F(OnvifClientTest, DroppedSubscriptionFailsThePullAndCanBeRenewed) {
   StartDevice({});
   OnvifEventClient client(Settings());
