@@ -26,6 +26,7 @@ Emulation MessoaEmulation();
 Emulation MessoaProEmulation();
 Emulation MobotixEmulation();
 Emulation OnvifEmulation();
+Emulation OnvifAlarmEmulation();
 Emulation PanasonicEmulation();
 Emulation PixordEmulation();
 Emulation PsiaEmulation();
@@ -59,6 +60,7 @@ const std::vector<Emulation>& Emulations() {
       MessoaProEmulation(),
       MobotixEmulation(),
       OnvifEmulation(),
+      OnvifAlarmEmulation(),
       PanasonicEmulation(),
       PixordEmulation(),
       PsiaEmulation(),

@@ -456,7 +456,9 @@ std::vector<std::string> OnvifDevice::Bodies() const {
 namespace {
 
 // camsim's ONVIF cameras: one device per simulated camera, made on its first request.
-void HandleOnvif(HttpConnection& connection, CameraState& state, const Login& login) {
+// alarm_topic: motion as VideoSource/MotionAlarm instead of the cell motion detector.
+void HandleOnvif(HttpConnection& connection, CameraState& state, const Login& login,
+                 bool alarm_topic) {
   static std::mutex mutex;
   // A camera's state may be freed and another made at its address (simulators run one after
   // another in one process): a new login makes a new device, and a connection still served
@@ -464,6 +466,7 @@ void HandleOnvif(HttpConnection& connection, CameraState& state, const Login& lo
   struct Slot {
     std::shared_ptr<OnvifDevice> device;
     Login login;
+    bool alarm_topic = false;
   };
   static std::map<CameraState*, Slot> devices;
   std::shared_ptr<OnvifDevice> device;
@@ -471,14 +474,16 @@ void HandleOnvif(HttpConnection& connection, CameraState& state, const Login& lo
     std::lock_guard<std::mutex> lock(mutex);
     Slot& slot = devices[&state];
     if (!slot.device || slot.login.required != login.required || slot.login.user != login.user ||
-        slot.login.password != login.password) {
+        slot.login.password != login.password || slot.alarm_topic != alarm_topic) {
       slot.login = login;
+      slot.alarm_topic = alarm_topic;
       OnvifDeviceOptions options;
       if (login.required) {
         options.user = login.user;
         options.password = login.password;
       }
-      options.cell_motion = true;
+      options.cell_motion = !alarm_topic;
+      options.motion_alarm = alarm_topic;
       options.inputs = 4;
       slot.device = std::make_shared<OnvifDevice>(options, &state);
     }
@@ -495,7 +500,22 @@ Emulation OnvifEmulation() {
                                   {"OnvifMD", "motion", nullptr},
                                   {"OnvifEID", "inputs", {{"inputs", 1}}},
                               });
-  e.handle_with_login = HandleOnvif;
+  e.handle_with_login = [](HttpConnection& c, CameraState& s, const Login& l) {
+    HandleOnvif(c, s, l, false);
+  };
+  return e;
+}
+
+// The same device announcing motion through the video source's MotionAlarm topic, as
+// cameras without a cell motion detector do.
+Emulation OnvifAlarmEmulation() {
+  Emulation e = MakeEmulation("onvifalarm", "ONVIF", nullptr,
+                              {
+                                  {"OnvifMD", "motion", nullptr},
+                              });
+  e.handle_with_login = [](HttpConnection& c, CameraState& s, const Login& l) {
+    HandleOnvif(c, s, l, true);
+  };
   return e;
 }
 
