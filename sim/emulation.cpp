@@ -25,6 +25,8 @@ Emulation LevelOneEmulation();
 Emulation MessoaEmulation();
 Emulation MessoaProEmulation();
 Emulation MobotixEmulation();
+Emulation OnvifEmulation();
+Emulation OnvifAlarmEmulation();
 Emulation PanasonicEmulation();
 Emulation PixordEmulation();
 Emulation PsiaEmulation();
@@ -57,6 +59,8 @@ const std::vector<Emulation>& Emulations() {
       MessoaEmulation(),
       MessoaProEmulation(),
       MobotixEmulation(),
+      OnvifEmulation(),
+      OnvifAlarmEmulation(),
       PanasonicEmulation(),
       PixordEmulation(),
       PsiaEmulation(),

@@ -64,6 +64,9 @@ struct Emulation {
   // Optional, for a camera with a TCP service: answers an HTTP request in place of `handle`,
   // knowing the service's port (the camera's CGIs tell clients where it listens).
   std::function<void(HttpConnection&, CameraState&, int tcp_port)> handle_with_tcp_port;
+  // Optional: answers an HTTP request in place of `handle`, for a camera that also checks
+  // credentials inside the request itself (a SOAP service's UsernameToken).
+  std::function<void(HttpConnection&, CameraState&, const Login&)> handle_with_login;
   // Optional, for a camera with a TCP service that the camera API names (an RTSP server):
   // the camera's `api:` block for a camera whose HTTP server listens on `port` and whose TCP
   // service listens on `tcp_port`; used in place of `api`.

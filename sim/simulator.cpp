@@ -19,7 +19,7 @@ namespace {
 // What every simulated camera does before its maker's handler: count the request, fall
 // silent when told to (hold the connection, answer nothing), ask for credentials.
 void Serve(HttpConnection& connection, CameraState& state, const Emulation& emulation,
-           const HttpAuth& auth, int tcp_port) {
+           const HttpAuth& auth, const Login& login, int tcp_port) {
   state.CountRequest();
   if (state.Get().silent) {
     while (!connection.PeerClosed() && connection.SleepFor(std::chrono::milliseconds(100))) {
@@ -32,6 +32,8 @@ void Serve(HttpConnection& connection, CameraState& state, const Emulation& emul
   }
   if (emulation.handle_with_tcp_port) {
     emulation.handle_with_tcp_port(connection, state, tcp_port);
+  } else if (emulation.handle_with_login) {
+    emulation.handle_with_login(connection, state, login);
   } else {
     emulation.handle(connection, state);
   }
@@ -122,7 +124,9 @@ bool Simulator::Start(const SimOptions& options, std::string* error) {
         tcp_port = station->tcp->Port();
       }
       station->server = std::make_unique<HttpServer>(
-          [state, e, auth, tcp_port](HttpConnection& c) { Serve(c, *state, *e, auth, tcp_port); },
+          [state, e, auth, login, tcp_port](HttpConnection& c) {
+            Serve(c, *state, *e, auth, login, tcp_port);
+          },
           host, 0);
       if (station->server->Port() <= 0 || (station->tcp && tcp_port <= 0)) {
         *error = "cannot listen on " + host + " for camera " + e->key + std::to_string(n);

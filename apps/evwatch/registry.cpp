@@ -28,6 +28,7 @@
 #include "detectors/messoa.h"
 #include "detectors/messoapro.h"
 #include "detectors/mobotix.h"
+#include "detectors/onvif.h"
 #include "detectors/psia.h"
 #include "detectors/sanyo.h"
 #include "detectors/sony.h"
@@ -230,6 +231,13 @@ const std::vector<DetectorClass>& DetectorClasses() {
                                    "GET /control/event.jpg?output=alarmupdate&filter=VM (type 0) "
                                    "or filter=SI (type 1) once per interval; an event while the "
                                    "first line's alarmcounter moved since the last reading"),
+      Row<OnvifMD, Cam>("OnvifMD", "ONVIF", K::kMotion,
+                        "POST /onvif/device_service and the event service it names: a pull-point "
+                        "subscription read as a long poll; motion (level 100) while "
+                        "CellMotionDetector IsMotion or MotionAlarm State of video source GetCH()"),
+      Row<OnvifEID, Cam, Inputs>("OnvifEID", "ONVIF", K::kInput,
+                                 "as OnvifMD; active while DigitalInput LogicalState of input "
+                                 "number `inputs` (the camera's Nth input token) is true"),
       Row<PanaJpgED, Cam, Api, DetType, PanaGroup>(
           "PanaJpgED", "Panasonic", K::kBoth,
           "JPEG frames of the API's stream (1, 2); COM segment: motion while byte 12 < byte 13 "

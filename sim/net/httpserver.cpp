@@ -14,7 +14,7 @@ namespace {
 // A client has this long to send its request head; a silent one then loses the connection.
 constexpr std::chrono::milliseconds kRequestTimeout{10000};
 constexpr size_t kMaxHeadBytes = 64 * 1024;
-// A request body up to this size is read and discarded; a larger one is refused.
+// A request body up to this size is read and kept for the handler; a larger one is refused.
 constexpr size_t kMaxBodyBytes = 1024 * 1024;
 
 // Blanks around a header value; the head is already cut at its line ends.
@@ -31,7 +31,7 @@ size_t HeadEnd(const std::string& buffer) {
 
 enum class ReadResult { kOk, kGone, kBad, kHeadTooLarge, kBodyTooLarge };
 
-// Reads the request head and discards a Content-Length body.
+// Reads the request head and its Content-Length body.
 ReadResult ReadRequest(TcpConnection& tcp, HttpRequest& request) {
   auto deadline = std::chrono::steady_clock::now() + kRequestTimeout;
   auto left = [&deadline] {
@@ -55,12 +55,12 @@ ReadResult ReadRequest(TcpConnection& tcp, HttpRequest& request) {
   unsigned long long length = std::strtoull(length_text.c_str(), &end, 10);
   if (end == length_text.c_str() || *end != '\0' || length_text[0] == '-') return ReadResult::kBad;
   if (length > kMaxBodyBytes) return ReadResult::kBodyTooLarge;
-  size_t have = buffer.size() - head_end;
-  while (have < length) {
+  request.body = buffer.substr(head_end, static_cast<size_t>(length));
+  while (request.body.size() < length) {
     if (left().count() <= 0) return ReadResult::kGone;
-    long n = tcp.Read(chunk, std::min<size_t>(sizeof(chunk), length - have), left());
+    long n = tcp.Read(chunk, std::min<size_t>(sizeof(chunk), length - request.body.size()), left());
     if (n <= 0) return ReadResult::kGone;
-    have += static_cast<size_t>(n);
+    request.body.append(chunk, static_cast<size_t>(n));
   }
   return ReadResult::kOk;
 }

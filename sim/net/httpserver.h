@@ -5,7 +5,7 @@
 // parts over time). After the handler returns the connection is closed, so every request
 // comes on its own connection (clients retrying with credentials reconnect). A client has
 // 10 s to send its request head (at most 64 KiB); a Content-Length body (at most 1 MiB) is
-// read and discarded before the handler runs; a malformed request gets 400 without it.
+// read before the handler runs (SOAP services answer from it); a malformed request gets 400 without it.
 //
 // Threads: handlers run on connection threads, several at once. Stop() (and the destructor)
 // wakes every handler that waits in SleepFor(), closes the connections and joins all threads.
@@ -29,6 +29,7 @@ struct HttpRequest {
   std::string target;   // path with query, as sent ("/a/b.cgi?x=1")
   std::string version;  // "HTTP/1.1"
   std::vector<std::pair<std::string, std::string>> headers;  // in order, as sent
+  std::string body;     // the Content-Length body; empty when none
 
   // The first header of that name (case-insensitive); empty when absent.
   std::string Header(std::string_view name) const;
