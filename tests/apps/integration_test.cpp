@@ -30,6 +30,18 @@ bool ForAll(const std::vector<std::string>& lines, const std::map<std::string, s
   return true;
 }
 
+// The detectors of `detectors` whose reports fail pred, for a failure message.
+std::string Missing(const std::vector<std::string>& lines, const std::map<std::string, std::string>& detectors,
+                    const std::function<bool(const std::vector<ReportLine>&)>& pred) {
+  Reports by = ByDetector(lines);
+  std::string missing;
+  for (const auto& [key, cls] : detectors) {
+    auto it = by.find(key);
+    if (it == by.end() || !pred(it->second)) missing += " " + key;
+  }
+  return missing;
+}
+
 bool SetAll(const Camsim& sim, const std::string& query) {
   bool ok = true;
   for (const auto& camera : sim.Cameras()) ok = sim.Set(camera["name"].get<std::string>(), query) && ok;
@@ -61,25 +73,24 @@ TEST(IntegrationTest, EveryClassReportsTheStateSetInTheSimulator) {
   ChildProcess evwatch({EvwatchPath(), "run", "-c", sim.ConfigPath()});
   ASSERT_TRUE(evwatch.Started());
   ASSERT_TRUE(evwatch.WaitForOut([&](const auto& l) { return ForAll(l, detectors, [](auto&) { return true; }); },
-                                 seconds(60)))
+                                 seconds(120)))
       << "not every detector reported";
 
+  // The bounds are generous: sixty detectors, and a sanitizer build on a loaded machine.
   ASSERT_TRUE(SetAll(sim, "motion=100&inputs=1"));
-  EXPECT_TRUE(evwatch.WaitForOut(
-      [&](const auto& l) { return ForAll(l, detectors, [](const auto& r) { return r.back().state; }); },
-      seconds(60)))
-      << "not every detector saw motion or an active input";
+  const auto active = [](const std::vector<ReportLine>& r) { return r.back().state; };
+  EXPECT_TRUE(evwatch.WaitForOut([&](const auto& l) { return ForAll(l, detectors, active); }, seconds(120)))
+      << "not every detector saw motion or an active input:" << Missing(evwatch.Out(), detectors, active);
   for (const auto& [key, reports] : ByDetector(evwatch.Out())) {
     EXPECT_GT(reports.back().value, 0) << key << ": an active reading carries a level or validity";
   }
 
   ASSERT_TRUE(SetAll(sim, "motion=0&inputs=0"));
-  EXPECT_TRUE(evwatch.WaitForOut(
-      [&](const auto& l) {
-        return ForAll(l, detectors, [](const auto& r) { return r.size() >= 2 && !r.back().state && r[r.size() - 2].state; });
-      },
-      seconds(60)))
-      << "not every detector went idle again";
+  const auto idle_again = [](const std::vector<ReportLine>& r) {
+    return r.size() >= 2 && !r.back().state && r[r.size() - 2].state;
+  };
+  EXPECT_TRUE(evwatch.WaitForOut([&](const auto& l) { return ForAll(l, detectors, idle_again); }, seconds(120)))
+      << "not every detector went idle again:" << Missing(evwatch.Out(), detectors, idle_again);
 
   evwatch.Signal(SIGTERM);
   std::optional<int> status = evwatch.Wait(seconds(120));

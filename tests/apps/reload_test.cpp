@@ -45,7 +45,7 @@ TEST(ReloadTest, SighupStartsAndStopsWhatChangedAndKeepsTheRest) {
   ChildProcess evwatch({EvwatchPath(), "run", "-c", file});
   ASSERT_TRUE(evwatch.Started());
   ASSERT_TRUE(evwatch.WaitForOut(
-      [](const auto& l) { return Count(l, "canon1/motion") == 1 && Count(l, "canon2/motion") == 1; }, seconds(30)));
+      [](const auto& l) { return Count(l, "canon1/motion") == 1 && Count(l, "canon2/motion") == 1; }, seconds(60)));
 
   dir.Write("cams.yaml", Cameras(sim, {"canon1", "canon3"}));
   evwatch.Signal(SIGHUP);
@@ -54,12 +54,12 @@ TEST(ReloadTest, SighupStartsAndStopsWhatChangedAndKeepsTheRest) {
       << Joined(evwatch.Err());
   EXPECT_NE(Joined(evwatch.Err()).find(": 1 detectors kept, 1 stopped, 1 started"), std::string::npos)
       << Joined(evwatch.Err());
-  ASSERT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon3/motion") == 1; }, seconds(30)));
+  ASSERT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon3/motion") == 1; }, seconds(60)));
 
   // canon1 kept running: it reports a change, and never a second first report.
   ASSERT_TRUE(sim.Set("canon1", "motion=100"));
   ASSERT_TRUE(sim.Set("canon2", "motion=100"));
-  ASSERT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon1/motion") == 2; }, seconds(30)));
+  ASSERT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon1/motion") == 2; }, seconds(60)));
   std::vector<ReportLine> canon1;
   for (const ReportLine& r : ParseReports(evwatch.Out())) {
     if (r.Key() == "canon1/motion") canon1.push_back(r);
@@ -85,18 +85,18 @@ TEST(ReloadTest, AFileWithErrorsLeavesEverythingRunning) {
   const std::string file = dir.Write("cams.yaml", Cameras(sim, {"canon1"}));
   ChildProcess evwatch({EvwatchPath(), "run", "-c", file});
   ASSERT_TRUE(evwatch.Started());
-  ASSERT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon1/motion") == 1; }, seconds(30)));
+  ASSERT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon1/motion") == 1; }, seconds(60)));
 
   dir.Write("cams.yaml", "cameras: [{name: canon1, host: 127.0.0.1, detectors: [{class: CanonMd}]}]\n");
   evwatch.Signal(SIGHUP);
   ASSERT_TRUE(evwatch.WaitForErr(
       [](const auto& l) { return Joined(l).find("everything keeps running as it was") != std::string::npos; },
-      seconds(30)))
+      seconds(60)))
       << Joined(evwatch.Err());
   EXPECT_NE(Joined(evwatch.Err()).find("unknown class \"CanonMd\""), std::string::npos) << Joined(evwatch.Err());
 
   ASSERT_TRUE(sim.Set("canon1", "motion=100"));
-  EXPECT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon1/motion") == 2; }, seconds(30)))
+  EXPECT_TRUE(evwatch.WaitForOut([](const auto& l) { return Count(l, "canon1/motion") == 2; }, seconds(60)))
       << "the detector stopped with the bad reload";
   evwatch.Signal(SIGTERM);
   EXPECT_EQ(evwatch.Wait(seconds(60)), 0);
