@@ -21,12 +21,6 @@ using evtest::Text;
 
 const char kMd[] = "/motion?mdresult";
 
-CameraAPIRecord MdApi(const std::string& path, int port) {
-  CameraAPIRecord record;
-  record.stream = StreamLocation{path, port};
-  return record;
-}
-
 class ArecontTest : public ::testing::Test {
  protected:
   struct Reading {
@@ -46,7 +40,7 @@ class ArecontTest : public ::testing::Test {
   FakeCamera cam_;
   Camera camera_{cam_.Record("admin", "")};
   // A relative path, and a port that is not the camera's: only the path is used.
-  CameraAPI api_{MdApi("motion?mdresult", 1)};
+  CameraAPI api_{evtest::ApiStreamAt("motion?mdresult", 1)};
 };
 
 TEST_F(ArecontTest, ValuesContainingNoMeanNoMotion) {

@@ -44,9 +44,7 @@ std::string Padded(size_t size, const std::string& last) {
 }
 
 CameraAPIRecord StreamAt(int port, const std::string& path = kPath) {
-  CameraAPIRecord record;
-  record.stream = StreamLocation{path, port};
-  return record;
+  return evtest::ApiStreamAt(path, port);
 }
 
 class AxisMDTest : public ::testing::Test {

@@ -35,9 +35,7 @@ using evtest::Report;
 const char kPath[] = "/cgi-bin/eventstream.cgi?type=all";
 
 CameraAPIRecord StreamAt(int port, const std::string& path = kPath) {
-  CameraAPIRecord record;
-  record.stream = StreamLocation{path, port};
-  return record;
+  return evtest::ApiStreamAt(path, port);
 }
 
 // ETROVISIONEID's DoEID as a MotionReading: result, active and level.

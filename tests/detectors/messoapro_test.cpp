@@ -21,12 +21,6 @@ using evtest::Text;
 
 const char kStatus[] = "/cgi-bin/status.cgi?group=Alarm";
 
-CameraAPIRecord StatusApi(const std::string& path, int port) {
-  CameraAPIRecord record;
-  record.stream = StreamLocation{path, port};
-  return record;
-}
-
 class MessoaProTest : public ::testing::Test {
  protected:
   struct Reading {
@@ -52,7 +46,7 @@ class MessoaProTest : public ::testing::Test {
   FakeCamera cam_;
   Camera camera_{cam_.Record("admin", "1234")};
   // The path as the model's API gives it, relative.
-  CameraAPI api_{StatusApi("cgi-bin/status.cgi?group=Alarm", cam_.Port())};
+  CameraAPI api_{evtest::ApiStreamAt("cgi-bin/status.cgi?group=Alarm", cam_.Port())};
 };
 
 TEST_F(MessoaProTest, ThreeMeansMotionAndInput) {
@@ -148,7 +142,7 @@ TEST_F(MessoaProTest, AnyContentTypeIsRead) {
 TEST_F(MessoaProTest, PathAndPortComeFromTheApi) {
   FakeCamera other;
   other.Answer("/alarm", Text("Alarm.Status=2\n"));
-  CameraAPI api(StatusApi("/alarm", other.Port()));
+  CameraAPI api(evtest::ApiStreamAt("/alarm", other.Port()));
   MessoaProMD detector(&camera_, &api);
   bool state = false;
   unsigned int level = 0;

@@ -19,6 +19,12 @@ void Play(const Reply& reply, evsim::HttpConnection& connection) {
 
 }  // namespace
 
+CameraAPIRecord ApiStreamAt(const std::string& path, int port) {
+  CameraAPIRecord record;
+  record.stream = StreamLocation{path, port};
+  return record;
+}
+
 Reply Respond(int status, const std::string& content_type, const std::string& body,
               const std::vector<std::string>& extra_headers, bool chunked) {
   return Reply{evsim::MakeResponse(status, content_type, body, extra_headers, chunked)};

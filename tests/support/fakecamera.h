@@ -26,6 +26,7 @@
 #include <vector>
 
 #include "framework/host/camera.h"
+#include "framework/host/cameraapi.h"
 #include "sim/net/httpauth.h"
 #include "sim/net/httpserver.h"
 
@@ -39,6 +40,10 @@ struct Reply {
 };
 
 // A whole response with Content-Length (or chunked).
+// A camera API whose default stream is at `path` on `port`, for detectors that ask their
+// API where the camera's stream is.
+CameraAPIRecord ApiStreamAt(const std::string& path, int port);
+
 Reply Respond(int status, const std::string& content_type, const std::string& body,
               const std::vector<std::string>& extra_headers = {}, bool chunked = false);
 // 200 with Content-Type text/plain (or the type given).
